@@ -1,0 +1,45 @@
+# Settings that every target shares, and the functions that make our targets.
+
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+set(CMAKE_RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR})
+set(CMAKE_CXX_FLAGS_DEV "-O1 -g" CACHE STRING "Flags of the Dev build type")
+set(CMAKE_EXE_LINKER_FLAGS_DEV "" CACHE STRING "Linker flags of the Dev build type")
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+find_package(Threads REQUIRED)
+
+add_library(kelvo_settings INTERFACE)
+target_include_directories(kelvo_settings INTERFACE ${CMAKE_SOURCE_DIR}/src)
+target_compile_options(kelvo_settings INTERFACE -Wall -Wextra -Wpedantic -Wshadow -Wnon-virtual-dtor
+    -Woverloaded-virtual -Wformat=2 -Wimplicit-fallthrough -Werror)
+target_compile_definitions(kelvo_settings INTERFACE KELVO_VERSION="${PROJECT_VERSION}")
+target_link_libraries(kelvo_settings INTERFACE Threads::Threads)
+
+if(KELVO_SANITIZE)
+    # GCC warns that TSan does not model fences; we use none of our own.
+    target_compile_options(kelvo_settings INTERFACE -fsanitize=${KELVO_SANITIZE} -fno-omit-frame-pointer
+        -fno-sanitize-recover=all $<$<CXX_COMPILER_ID:GNU>:-Wno-tsan>)
+    target_link_options(kelvo_settings INTERFACE -fsanitize=${KELVO_SANITIZE})
+endif()
+if(KELVO_FUZZ)
+    target_compile_options(kelvo_settings INTERFACE -fsanitize=fuzzer-no-link)
+endif()
+
+# kelvo_library(NAME [DEPENDS target...]): the static library of the current folder, from all its sources.
+function(kelvo_library name)
+    cmake_parse_arguments(ARG "" "" "DEPENDS" ${ARGN})
+    file(GLOB sources CONFIGURE_DEPENDS *.cpp)
+    add_library(${name} STATIC ${sources})
+    target_link_libraries(${name} PUBLIC kelvo_settings ${ARG_DEPENDS})
+endfunction()
+
+# kelvo_test(NAME [DEPENDS target...]): a GoogleTest program from all sources of the current folder.
+function(kelvo_test name)
+    cmake_parse_arguments(ARG "" "" "DEPENDS" ${ARGN})
+    file(GLOB sources CONFIGURE_DEPENDS *.cpp)
+    add_executable(${name} ${sources})
+    target_include_directories(${name} PRIVATE ${CMAKE_SOURCE_DIR}/tests)
+    target_link_libraries(${name} PRIVATE kelvo_settings ${ARG_DEPENDS} kelvo_test_support)
+    gtest_discover_tests(${name} DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 120)
+endfunction()

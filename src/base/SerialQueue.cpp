@@ -1,0 +1,177 @@
+#include "base/SerialQueue.h"
+
+#include "base/ThreadName.h"
+
+#include <algorithm>
+#include <condition_variable>
+#include <cstdio>
+#include <cstdlib>
+#include <deque>
+#include <mutex>
+#include <thread>
+#include <vector>
+
+namespace kelvo {
+namespace {
+
+/// A `sync` caller that waits for its turn.
+struct Turn {
+    std::condition_variable granted;
+    bool isGranted = false;
+};
+
+/// What waits in the queue: a task for the queue's thread, or somebody's turn.
+struct Item {
+    Task task;
+    Turn* turn = nullptr;
+};
+
+/// The queues on which the calling thread runs, outermost first.
+std::vector<const void*>& queuesOfThread() {
+    thread_local std::vector<const void*> queues;
+    return queues;
+}
+
+/// Marks the calling thread as running on a queue.
+class Running {
+  public:
+    explicit Running(const void* queue) { queuesOfThread().push_back(queue); }
+    ~Running() { queuesOfThread().pop_back(); }
+    Running(const Running&) = delete;
+    Running& operator=(const Running&) = delete;
+};
+
+}  // namespace
+
+/// One token says who may run: nobody (`busy_` is false), the queue's thread, or one `sync` caller. Whoever
+/// holds it passes it on to the oldest item when its own work is done.
+class SerialQueue::State {
+  public:
+    explicit State(std::string label) : label_(std::move(label)) {}
+
+    const std::string& label() const { return label_; }
+
+    bool isCurrent() const {
+        const auto& queues = queuesOfThread();
+        return std::find(queues.begin(), queues.end(), this) != queues.end();
+    }
+
+    void async(Task task, const std::shared_ptr<State>& self) {
+        std::lock_guard lock(mutex_);
+        items_.push_back({std::move(task), nullptr});
+        if (!worker_.joinable()) worker_ = std::thread([self] { self->work(); });
+        if (!busy_) passToken();
+    }
+
+    void sync(const Task& task) {
+        if (isCurrent()) abortWithLabel();
+        acquireToken();
+        {
+            const Running running(this);
+            task();
+        }
+        std::lock_guard lock(mutex_);
+        passToken();
+    }
+
+    void finish() {
+        std::thread worker;
+        {
+            std::lock_guard lock(mutex_);
+            finishing_ = true;
+            worker = std::move(worker_);
+            workerWakes_.notify_one();
+        }
+        if (!worker.joinable()) return;
+        if (worker.get_id() == std::this_thread::get_id()) {
+            worker.detach();  // the last reference went in one of our own tasks; the state lives on with the
+                              // thread
+        } else {
+            worker.join();
+        }
+    }
+
+  private:
+    [[noreturn]] void abortWithLabel() const {
+        std::fprintf(stderr, "sync onto the queue \"%s\" by a task that runs on it\n", label_.c_str());
+        std::abort();
+    }
+
+    void acquireToken() {
+        std::unique_lock lock(mutex_);
+        if (!busy_) {
+            busy_ = true;
+            return;
+        }
+        Turn turn;
+        items_.push_back({nullptr, &turn});
+        turn.granted.wait(lock, [&turn] { return turn.isGranted; });
+    }
+
+    /// Under the lock, by the holder of the token (or by anyone while nobody holds it).
+    void passToken() {
+        busy_ = !items_.empty();
+        if (!busy_) return;
+        if (Turn* turn = items_.front().turn; turn != nullptr) {
+            items_.pop_front();
+            turn->isGranted = true;
+            turn->granted.notify_one();
+        } else {
+            workerHasToken_ = true;
+            workerWakes_.notify_one();
+        }
+    }
+
+    void work() {
+        nameCurrentThread(label_);
+        const Running running(this);
+        std::unique_lock lock(mutex_);
+        while (true) {
+            workerWakes_.wait(lock, [this] { return workerHasToken_ || (finishing_ && !busy_); });
+            if (!workerHasToken_) return;
+            workerHasToken_ = false;
+            runOwnItems(lock);
+            passToken();
+        }
+    }
+
+    void runOwnItems(std::unique_lock<std::mutex>& lock) {
+        while (!items_.empty() && items_.front().turn == nullptr) {
+            Task task = std::move(items_.front().task);
+            items_.pop_front();
+            lock.unlock();
+            task();
+            task = nullptr;  // what the task holds goes before the next one runs, and outside the lock
+            lock.lock();
+        }
+    }
+
+    const std::string label_;
+    std::mutex mutex_;
+    std::condition_variable workerWakes_;
+    std::deque<Item> items_;
+    std::thread worker_;
+    bool busy_ = false;
+    bool workerHasToken_ = false;
+    bool finishing_ = false;
+};
+
+SerialQueue::SerialQueue(std::string label) : state_(std::make_shared<State>(std::move(label))) {}
+SerialQueue::~SerialQueue() {
+    state_->finish();
+}
+
+const std::string& SerialQueue::label() const {
+    return state_->label();
+}
+bool SerialQueue::isCurrent() const {
+    return state_->isCurrent();
+}
+void SerialQueue::async(Task task) {
+    state_->async(std::move(task), state_);
+}
+void SerialQueue::sync(const Task& task) {
+    state_->sync(task);
+}
+
+}  // namespace kelvo

@@ -1,0 +1,75 @@
+#pragma once
+
+#include "base/MediaRecords.h"
+#include "base/Result.h"
+#include "base/UniqueFd.h"
+#include "base/Value.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <span>
+
+namespace kelvo {
+
+/// The picture of one video frame in a memory file that another process can map. Pixels never travel in
+/// messages: the descriptor does. Thread-safe as far as its pixels are not written while somebody reads them.
+class VideoSurface : public ObjectHandle {
+  public:
+    enum class PixelFormat : std::uint32_t {
+        BGRx = fourCharacterCode("BGRx"),  ///< 4 bytes a pixel: blue, green, red, unused
+    };
+
+    /// The shape of the picture. Width and height are 1 to 16384 pixels; a row is at least 4 * width bytes.
+    struct Geometry {
+        std::uint32_t width = 0;
+        std::uint32_t height = 0;
+        std::uint32_t bytesPerRow = 0;
+        PixelFormat pixelFormat = PixelFormat::BGRx;
+
+        /// Rows without gaps.
+        static Geometry packed(std::uint32_t width, std::uint32_t height) {
+            return {width, height, width * 4};
+        }
+        std::size_t byteCount() const { return std::size_t{bytesPerRow} * height; }
+        bool isValid() const;
+
+        friend bool operator==(const Geometry&, const Geometry&) = default;
+    };
+
+    /// A new surface of black pixels in a memory file of its own. Fails on a bad geometry and when memory or
+    /// descriptors run out.
+    static Result<std::shared_ptr<VideoSurface>> create(const Geometry& geometry);
+
+    /// A read-only view of a surface that another process made. Fails on a bad geometry and when the file
+    /// behind `descriptor` is smaller than the geometry says or could still shrink.
+    static Result<std::shared_ptr<VideoSurface>> fromDescriptor(UniqueFd descriptor,
+                                                                const Geometry& geometry);
+
+    ~VideoSurface() override;
+
+    const Geometry& geometry() const { return geometry_; }
+    std::uint32_t width() const { return geometry_.width; }
+    std::uint32_t height() const { return geometry_.height; }
+
+    std::span<const std::byte> pixels() const { return {pixels_, geometry_.byteCount()}; }
+    /// The pixels to draw into; empty when the surface is somebody else's.
+    std::span<std::byte> writablePixels() const;
+
+    /// The memory file; stays owned by the surface.
+    int descriptor() const { return descriptor_.get(); }
+
+  private:
+    VideoSurface(UniqueFd descriptor, const Geometry& geometry, std::byte* pixels, bool isWritable);
+    static Result<std::shared_ptr<VideoSurface>> map(UniqueFd descriptor, const Geometry& geometry,
+                                                     bool isWritable);
+
+    UniqueFd descriptor_;
+    Geometry geometry_;
+    std::byte* pixels_;
+    bool isWritable_;
+};
+
+using VideoSurfaceRef = std::shared_ptr<VideoSurface>;
+
+}  // namespace kelvo
