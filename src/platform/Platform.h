@@ -1,0 +1,45 @@
+#pragma once
+
+#include "base/Clock.h"
+#include "base/MainQueue.h"
+#include "platform/BulletinService.h"
+#include "platform/Bundles.h"
+#include "platform/CallObserver.h"
+#include "platform/DeviceProperties.h"
+#include "platform/DisplayLayout.h"
+#include "platform/FileSystem.h"
+#include "platform/IPC.h"
+#include "platform/NotificationCenter.h"
+#include "platform/Preferences.h"
+#include "platform/Random.h"
+#include "platform/RestrictionsProfile.h"
+#include "platform/StoragePurgeService.h"
+#include "platform/TextFolding.h"
+
+#include <memory>
+
+namespace kelvo {
+
+/// Everything that the operating system supplies, gathered once in `main` or by a test and handed to
+/// constructors. Nothing above this layer reads the world in any other way. Services are destroyed in reverse
+/// order, so one may rely on those above it.
+struct Platform {
+    std::shared_ptr<Clock> clock;
+    std::shared_ptr<Random> random;
+    std::shared_ptr<MainQueue> mainQueue;
+    std::shared_ptr<FileSystem> fileSystem;
+    std::shared_ptr<TextFolding> textFolding;
+    std::shared_ptr<BundleService> bundles;
+    std::shared_ptr<Languages> languages;
+    std::shared_ptr<Preferences> preferences;
+    std::shared_ptr<DeviceProperties> device;
+    std::shared_ptr<NotificationCenter> notifications;
+    std::shared_ptr<StoragePurgeService> storagePurge;
+    std::shared_ptr<CallObserver> calls;
+    std::shared_ptr<RestrictionsProfile> restrictions;
+    std::shared_ptr<DisplayLayoutService> displayLayout;
+    std::shared_ptr<BulletinService> bulletins;
+    std::shared_ptr<IPCTransport> ipc;
+};
+
+}  // namespace kelvo
