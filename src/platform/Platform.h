@@ -14,6 +14,7 @@
 #include "platform/Random.h"
 #include "platform/RestrictionsProfile.h"
 #include "platform/StoragePurgeService.h"
+#include "platform/SystemAlert.h"
 #include "platform/TextFolding.h"
 
 #include <memory>
@@ -39,6 +40,7 @@ struct Platform {
     std::shared_ptr<RestrictionsProfile> restrictions;
     std::shared_ptr<DisplayLayoutService> displayLayout;
     std::shared_ptr<BulletinService> bulletins;
+    std::shared_ptr<SystemAlertService> alerts;
     std::shared_ptr<IPCTransport> ipc;
 };
 
