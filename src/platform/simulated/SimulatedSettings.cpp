@@ -15,7 +15,34 @@ void SimulatedRandom::fill(std::span<std::byte> bytes) {
     });
 }
 
+namespace {
+
+/// How many bytes the character at the start of `text` has; 0 when no character stands there.
+std::size_t characterLength(std::string_view text) {
+    const auto first = static_cast<unsigned char>(text.front());
+    if (first < 0x80) return 1;
+    if (first < 0xC2 || first > 0xF4) return 0;
+    const std::size_t length = first < 0xE0 ? 2 : first < 0xF0 ? 3 : 4;
+    if (text.size() < length) return 0;
+    for (std::size_t i = 1; i < length; ++i) {
+        if ((static_cast<unsigned char>(text[i]) & 0xC0U) != 0x80) return 0;
+    }
+    return length;
+}
+
+bool isUTF8(std::string_view text) {
+    while (!text.empty()) {
+        const std::size_t length = characterLength(text);
+        if (length == 0) return false;
+        text.remove_prefix(length);
+    }
+    return true;
+}
+
+}  // namespace
+
 std::string SimulatedTextFolding::folded(std::string_view text) {
+    if (!isUTF8(text)) return std::string(text);
     // The base letters of U+00C0 to U+00DF; in UTF-8 these are the byte 0xC3 and one of 0x80 to 0x9F, and
     // their small forms lie 0x20 above. A dot keeps the letter as it is.
     constexpr std::string_view kBaseLetters = "aaaaaa.ceeeeiiii.nooooo.ouuuuy..";
