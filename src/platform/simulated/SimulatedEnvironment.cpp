@@ -66,7 +66,7 @@ std::shared_ptr<DisplayLayoutMonitor> SimulatedDisplayLayout::createMonitor(int)
     return monitor;
 }
 
-void SimulatedDisplayLayout::change(DisplayLayout layout) {
+void SimulatedDisplayLayout::change(const DisplayLayout& layout) {
     shared_->layout.set(layout);
     const std::shared_ptr<DisplayLayoutMonitor> monitor = lastMonitor_.copy();
     for (const auto& [key, weak] : shared_->observers.copy()) {
