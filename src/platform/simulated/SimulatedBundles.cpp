@@ -102,6 +102,7 @@ BundleRef SimulatedBundles::bundleAtPath(std::string_view path) {
 }
 
 BundleRef SimulatedBundles::bundleWithIdentifier(std::string_view bundleIdentifier) {
+    if (bundleIdentifier.empty()) return nullptr;  // a localization's folder has none
     return world_.with([&](World& world) -> BundleRef {
         for (const auto& [path, content] : world.bundles) {
             if (content.bundleIdentifier == bundleIdentifier)
