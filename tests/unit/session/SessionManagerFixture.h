@@ -67,6 +67,14 @@ class SessionManagerFixture : public testing::Test {
         bundles->addBundle("/System/Library/Frameworks/KelvoKit.framework", framework);
     }
 
+    /// A finish that is never completed holds its session.
+    ~SessionManagerFixture() override {
+        for (const FakeSessionRef& session : sessions) {
+            session->finish = nullptr;
+            session->cleanup = nullptr;
+        }
+    }
+
     /// The session of a client that records.
     FakeSessionRef recording(const std::string& bundleID) {
         const auto session = std::static_pointer_cast<FakeRecordingSession>(
@@ -94,6 +102,7 @@ class SessionManagerFixture : public testing::Test {
     std::shared_ptr<DiaryDelegate> delegate = std::make_shared<DiaryDelegate>(diary);
     std::shared_ptr<SimulatedBundles> bundles = std::make_shared<SimulatedBundles>();
     Texts createdSessions;
+    std::vector<FakeSessionRef> sessions;
     KVSessionManager manager{[this](const std::string& bundleID) {
                                  createdSessions.push_back(bundleID);
                                  auto session = std::make_shared<FakeRecordingSession>(bundleID);
