@@ -4,8 +4,7 @@ set(CMAKE_CXX_STANDARD 20)
 set(CMAKE_CXX_STANDARD_REQUIRED ON)
 set(CMAKE_CXX_EXTENSIONS OFF)
 set(CMAKE_RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR})
-set(CMAKE_CXX_FLAGS_DEV "-O1 -g" CACHE STRING "Flags of the Dev build type")
-set(CMAKE_EXE_LINKER_FLAGS_DEV "" CACHE STRING "Linker flags of the Dev build type")
+set(CMAKE_CXX_FLAGS_DEV "-O1 -g1")  # the everyday build type: quick to build, fit to debug
 set(CMAKE_POSITION_INDEPENDENT_CODE ON)
 find_package(Threads REQUIRED)
 
