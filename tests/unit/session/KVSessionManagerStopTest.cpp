@@ -272,9 +272,8 @@ TEST_F(KVSessionManagerStopTest, InterruptionAgainstNoSessionFinishesEveryActive
 
 TEST_F(KVSessionManagerStopTest, SessionsAreVisitedInTheOrderOfTheirIdentifiers) {
     std::vector<std::string> expected;
-    std::vector<test::FakeSessionRef> sessions;
     for (const char* name : {"d", "b", "h", "a", "f", "c", "g", "e"})
-        sessions.push_back(recording(name));
+        recording(name);
     for (const char* name : {"a", "b", "c", "d", "e", "f", "g", "h"})
         expected.push_back(std::string(name) + ": finishSession");
     manager.stopInAppRecordingSessionsBecauseOfMultitasking();

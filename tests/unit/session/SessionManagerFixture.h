@@ -67,6 +67,14 @@ class SessionManagerFixture : public testing::Test {
         bundles->addBundle("/System/Library/Frameworks/KelvoKit.framework", framework);
     }
 
+    /// A finish that is never completed holds its session.
+    ~SessionManagerFixture() override {
+        for (const FakeSessionRef& session : sessions_) {
+            session->finish = nullptr;
+            session->cleanup = nullptr;
+        }
+    }
+
     /// The session of a client that records.
     FakeSessionRef recording(const std::string& bundleID) {
         const auto session = std::static_pointer_cast<FakeRecordingSession>(
@@ -94,19 +102,25 @@ class SessionManagerFixture : public testing::Test {
     std::shared_ptr<DiaryDelegate> delegate = std::make_shared<DiaryDelegate>(diary);
     std::shared_ptr<SimulatedBundles> bundles = std::make_shared<SimulatedBundles>();
     Texts createdSessions;
-    KVSessionManager manager{[this](const std::string& bundleID) {
-                                 createdSessions.push_back(bundleID);
-                                 auto session = std::make_shared<FakeRecordingSession>(bundleID);
-                                 session->onRequest = [this, bundleID](const auto& request) {
-                                     diary.push_back(bundleID + ": " + request);
-                                 };
-                                 session->client->onMessage = [this, bundleID](const auto& message) {
-                                     diary.push_back(bundleID + "'s client: " + message);
-                                 };
-                                 return session;
-                             },
+    KVSessionManager manager{[this](const std::string& bundleID) { return makeSession(bundleID); },
                              std::make_shared<KVUserErrors>(std::make_shared<KVLocalization>(
                                  bundles, std::make_shared<SimulatedLanguages>()))};
+
+  private:
+    SessionRef makeSession(const std::string& bundleID) {
+        createdSessions.push_back(bundleID);
+        auto session = std::make_shared<FakeRecordingSession>(bundleID);
+        session->onRequest = [this, bundleID](const auto& request) {
+            diary.push_back(bundleID + ": " + request);
+        };
+        session->client->onMessage = [this, bundleID](const auto& message) {
+            diary.push_back(bundleID + "'s client: " + message);
+        };
+        sessions_.push_back(session);
+        return session;
+    }
+
+    std::vector<FakeSessionRef> sessions_;
 };
 
 }  // namespace kelvo::test
