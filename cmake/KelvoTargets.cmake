@@ -12,6 +12,8 @@ add_library(kelvo_settings INTERFACE)
 target_include_directories(kelvo_settings INTERFACE ${CMAKE_SOURCE_DIR}/src)
 target_compile_options(kelvo_settings INTERFACE -Wall -Wextra -Wpedantic -Wshadow -Wnon-virtual-dtor
     -Woverloaded-virtual -Wformat=2 -Wimplicit-fallthrough -Werror)
+# GCC 12 reports overlaps in its own std::string that cannot happen.
+target_compile_options(kelvo_settings INTERFACE $<$<CXX_COMPILER_ID:GNU>:-Wno-restrict>)
 target_compile_definitions(kelvo_settings INTERFACE KELVO_VERSION="${PROJECT_VERSION}")
 target_link_libraries(kelvo_settings INTERFACE Threads::Threads)
 
