@@ -47,6 +47,14 @@ std::string probeFormat(const std::string& path, const std::string& entry) {
                             quoted(path) + " 2>&1"));
 }
 
+double rotation(const std::string& path) {
+    return std::strtod(outputOf("ffprobe -v error -select_streams v:0 -show_entries "
+                                "stream_side_data=rotation -of csv=p=0 " +
+                                quoted(path))
+                           .c_str(),
+                       nullptr);
+}
+
 std::vector<double> frameTimes(const std::string& path, const std::string& stream) {
     std::istringstream lines(outputOf("ffprobe -v error -select_streams " + stream +
                                       " -show_entries frame=pts_time -of csv=p=0 " + quoted(path)));

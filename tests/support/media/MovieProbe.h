@@ -17,6 +17,9 @@ std::string decodingComplaints(const std::string& path);
 std::string probeStream(const std::string& path, const std::string& stream, const std::string& entry);
 std::string probeFormat(const std::string& path, const std::string& entry);
 
+/// By how many degrees players turn the picture.
+double rotation(const std::string& path);
+
 /// The times in seconds at which decoded frames of a stream are shown, in order.
 std::vector<double> frameTimes(const std::string& path, const std::string& stream);
 

@@ -35,8 +35,8 @@ class TestMovie {
         double frameRate = 30;
         bool hasAudio1 = true;
         bool hasAudio2 = true;
-        AffineTransform transform;
-        Dictionary videoSettings;  ///< the usual ones when empty
+        AffineTransform transform{};
+        Dictionary videoSettings{};  ///< the usual ones when empty
         std::int64_t start = 5 * kSecond;
     };
 

@@ -29,20 +29,32 @@ OptionalError AudioAligner::add(PcmBlock block, double seconds) {
     if (!position_) return beginAt(block, wanted);
     if (wanted - inputPosition() > kLongestGap * sampleRate_) return std::nullopt;
     const double difference = wanted - inputPosition();
-    if (difference >= kGap * sampleRate_) {
-        if (OptionalError error = fillGap(std::llround(difference))) return error;
-    } else if (difference <= -kGap * sampleRate_) {
-        block.dropFirst(static_cast<std::size_t>(std::llround(-difference * inputRate_ / sampleRate_)));
-        smoothedDifference_ = 0;
-    } else {
+    const double gap = kGap * sampleRate_;
+    if (difference <= -gap || (isCutting_ && difference < 0)) {
+        cut(block, -difference);
+        return resample(block);
+    }
+    isCutting_ = false;
+    if (difference < gap) {
         follow(difference);
+    } else if (OptionalError error = fillGap(std::llround(difference))) {
+        return error;
     }
     return resample(block);
 }
 
+/// Drops `count` samples (of the output's rate) from the front. An overlap that takes a whole block goes on
+/// in the next, down to its last sample.
+void AudioAligner::cut(PcmBlock& block, double count) {
+    const auto cutSamples = static_cast<std::size_t>(std::llround(count * inputRate_ / sampleRate_));
+    isCutting_ = cutSamples >= block.sampleCount();
+    block.dropFirst(cutSamples);
+    smoothedDifference_ = 0;
+}
+
 OptionalError AudioAligner::beginAt(PcmBlock& block, double position) {
     if (position < 0) {
-        block.dropFirst(static_cast<std::size_t>(std::llround(-position * inputRate_ / sampleRate_)));
+        cut(block, -position);
         position = 0;
     }
     if (block.sampleCount() == 0) return std::nullopt;

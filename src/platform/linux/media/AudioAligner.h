@@ -40,6 +40,7 @@ class AudioAligner {
     OptionalError prepareResampler(const PcmBlock& block);
     OptionalError beginAt(PcmBlock& block, double position);
     OptionalError fillGap(std::int64_t count);
+    void cut(PcmBlock& block, double count);
     void follow(double difference);
     OptionalError resample(const PcmBlock& block);
     OptionalError resampleSilence(std::size_t count);
@@ -53,6 +54,7 @@ class AudioAligner {
     std::size_t inputChannels_ = 0;
     std::optional<std::int64_t> position_;  ///< of the next sample that goes to the sink
     double smoothedDifference_ = 0;
+    bool isCutting_ = false;  ///< the last block was cut whole
     std::vector<float> left_;
     std::vector<float> right_;
 };
