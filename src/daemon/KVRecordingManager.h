@@ -1,0 +1,172 @@
+#pragma once
+
+#include "base/Guarded.h"
+#include "base/SerialQueue.h"
+#include "ipc/KVConnectionManager.h"
+#include "ipc/KVUserErrors.h"
+#include "platform/PhotoAsset.h"
+#include "platform/Platform.h"
+#include "session/KVSessionManager.h"
+#include "support/KVApplicationStateMonitor.h"
+#include "support/KVLocalization.h"
+#include "support/KVStatusBarAssertion.h"
+#include "support/KVTemporaryFileStore.h"
+
+#include <atomic>
+#include <memory>
+#include <optional>
+#include <set>
+#include <string>
+
+namespace kelvo {
+
+/// The daemon's one coordinator: owns every long-lived service, serves every client request and decides what
+/// the user sees. Created once when the process starts and never replaced.
+///
+/// Requests run one at a time on the connection manager's queue. The blanked-screen handler runs on the
+/// global queue of normal priority, calls on the main queue, restrictions, layouts and purges on their
+/// services' threads, alerts on the alert queue; state that several of them touch is atomic or guarded.
+class KVRecordingManager : public KVConnectionManagerDelegate,
+                           public KVSessionManagerDelegate,
+                           public CallObserverDelegate,
+                           public RestrictionsObserver,
+                           public DisplayLayoutObserver,
+                           public BulletinDataProvider,
+                           public std::enable_shared_from_this<KVRecordingManager> {
+  public:
+    /// Builds the manager and registers it with the platform's services. Never fails: each service is created
+    /// unconditionally. Clients are not accepted before `finishStartup`.
+    static std::shared_ptr<KVRecordingManager> create(const Platform& platform, SessionFactory createSession);
+    ~KVRecordingManager() override;
+
+    /// Accepts clients from now on. Once, right after `create`.
+    void finishStartup();
+
+    /// The queue on which every blocking alert is shown; one for the process.
+    static SerialQueue& kelvoAlertQueue();
+
+    /// Called when a recording starts and when a session is reset. They do nothing, and keep the order
+    /// visible.
+    void beginTransaction() {}
+    void endTransaction() {}
+
+    /// Whether the client whose request is served holds "com.quillon.private.kelvo-kit".
+    bool clientHasSystemEntitlements() const;
+    /// The bundle identifier of that client; none when its program belongs to no bundle.
+    std::optional<std::string> getCallingConnectionBundleID() const;
+    /// That client's session, or none.
+    SessionRef getCallingConnectionRecordingSession() const;
+
+    // Session manager's delegate.
+    void prepareForStoppingSession(const SessionRef& session) override;
+    void resetStatesForSession(const SessionRef& session) override;
+    void recordingSessionStoppedWithError(const SessionRef& session, const OptionalError& error,
+                                          const std::optional<URL>& movieURL) override;
+    void failedToSaveRecordingForRecordingSession(const SessionRef& session, const KVError& error) override;
+    void saveVideoToCameraRoll(const std::optional<URL>& movieURL, ErrorHandler completion) override;
+
+    // What the world around a recording does.
+    void callObserverCallChanged(CallObserver& observer, const Call& call) override;
+    void profileConnectionDidReceiveEffectiveSettingsChangedNotification(
+        RestrictionsProfile& profile) override;
+    void layoutMonitorDidUpdateDisplayLayout(DisplayLayoutMonitor& monitor,
+                                             const DisplayLayout& layout) override;
+    /// The number of elements that are applications: those of level 0 and 1.
+    static std::int64_t countLevelOneElementsWithLayout(const DisplayLayout& layout);
+
+    // Storage-purge callbacks, on the purge service's thread.
+    std::int64_t purgeableSpace(PurgeUrgency urgency);
+    std::uint64_t purge(PurgeUrgency urgency);
+    std::uint64_t periodicPurge();
+
+    // Plain accessors; nothing else happens in them.
+    const std::shared_ptr<IPCListener>& publicListener() const { return publicListener_; }
+    const std::shared_ptr<KVConnectionManager>& connectionManager() const { return connectionManager_; }
+    const std::shared_ptr<KVSessionManager>& sessionManager() const { return sessionManager_; }
+    const std::shared_ptr<KVApplicationStateMonitor>& applicationStateMonitor() const {
+        return applicationStateMonitor_;
+    }
+    const std::shared_ptr<CallObserver>& callObserver() const { return callObserver_; }
+    const std::shared_ptr<KVStatusBarAssertion>& statusBarAssertion() const { return statusBarAssertion_; }
+    SerialQueue& dataProviderQueue() { return dataProviderQueue_; }
+    const std::shared_ptr<BulletinConnection>& dataProviderConnection() const {
+        return dataProviderConnection_;
+    }
+    const std::shared_ptr<BulletinProxy>& dataProviderProxy() const { return dataProviderProxy_; }
+    const std::shared_ptr<DisplayLayoutMonitor>& layoutMonitor() const { return layoutMonitor_; }
+    void setLayoutMonitor(std::shared_ptr<DisplayLayoutMonitor> monitor) {
+        layoutMonitor_ = std::move(monitor);
+    }
+
+    bool isMicrophoneRecording() const { return microphoneRecording_; }
+    void setMicrophoneRecording(bool recording) { microphoneRecording_ = recording; }
+    bool isCameraRecording() const { return cameraRecording_; }
+    void setCameraRecording(bool recording) { cameraRecording_ = recording; }
+    bool deviceLocked() const { return deviceLocked_; }
+    void setDeviceLocked(bool locked) { deviceLocked_ = locked; }
+    std::int64_t levelOneElementCount() const { return levelOneElementCount_; }
+    void setLevelOneElementCount(std::int64_t count) { levelOneElementCount_ = count; }
+    NotificationToken lockToResetToken() const { return lockToResetToken_; }
+
+    Guarded<std::set<std::string>>& exemptBundleIdentifiers() { return exemptBundleIdentifiers_; }
+    Guarded<std::set<std::string>>& exemptWithMicRecordingEnabledBundleIdentifiers() {
+        return exemptWithMicRecordingEnabledBundleIdentifiers_;
+    }
+    Guarded<Dictionary>& lastBackgroundDateByBundleIdentifier() {
+        return lastBackgroundDateByBundleIdentifier_;
+    }
+    Guarded<Dictionary>& currentAvailableExtensions() { return currentAvailableExtensions_; }
+    Guarded<std::shared_ptr<SystemAlert>>& userNotificationStopRecording() {
+        return userNotificationStopRecording_;
+    }
+    Guarded<std::optional<PhotoAsset>>& photoAsset() { return photoAsset_; }
+    Guarded<std::optional<Bytes>>& currentHostAppImage() { return currentHostAppImage_; }
+    Guarded<std::optional<Bytes>>& currentExtensionAppImage() { return currentExtensionAppImage_; }
+    Guarded<std::optional<std::string>>& currentExtensionDisplayName() {
+        return currentExtensionDisplayName_;
+    }
+
+  private:
+    KVRecordingManager(const Platform& platform, SessionFactory createSession);
+    void registerWithPlatform();
+    bool isLockedRecordingEnabled() const;
+    void setUpDeviceLockNotifications();
+    void blankedScreenChanged(NotificationToken token);
+    void connectBulletins();
+    void registerPurgeCallbacks();
+    void clearSystemRecordingUI(const SessionRef& session);
+
+    const Platform platform_;
+    const std::shared_ptr<KVLocalization> localization_;
+    const std::shared_ptr<KVUserErrors> errors_;
+    const std::shared_ptr<KVTemporaryFileStore> fileStore_;
+
+    std::shared_ptr<KVConnectionManager> connectionManager_;
+    std::shared_ptr<IPCListener> publicListener_;
+    std::shared_ptr<KVSessionManager> sessionManager_;
+    std::shared_ptr<KVApplicationStateMonitor> applicationStateMonitor_;
+    std::shared_ptr<CallObserver> callObserver_;
+    std::shared_ptr<KVStatusBarAssertion> statusBarAssertion_;
+    SerialQueue dataProviderQueue_{"com.quillon.kelvod.bulletinboard"};
+    std::shared_ptr<BulletinConnection> dataProviderConnection_;
+    std::shared_ptr<BulletinProxy> dataProviderProxy_;
+    std::shared_ptr<DisplayLayoutMonitor> layoutMonitor_;
+
+    std::atomic<bool> microphoneRecording_{false};
+    std::atomic<bool> cameraRecording_{false};
+    std::atomic<bool> deviceLocked_{false};
+    std::atomic<std::int64_t> levelOneElementCount_{0};
+    std::atomic<NotificationToken> lockToResetToken_{0};
+
+    Guarded<std::set<std::string>> exemptBundleIdentifiers_;
+    Guarded<std::set<std::string>> exemptWithMicRecordingEnabledBundleIdentifiers_;
+    Guarded<Dictionary> lastBackgroundDateByBundleIdentifier_;
+    Guarded<Dictionary> currentAvailableExtensions_;
+    Guarded<std::shared_ptr<SystemAlert>> userNotificationStopRecording_;
+    Guarded<std::optional<PhotoAsset>> photoAsset_;
+    Guarded<std::optional<Bytes>> currentHostAppImage_;
+    Guarded<std::optional<Bytes>> currentExtensionAppImage_;
+    Guarded<std::optional<std::string>> currentExtensionDisplayName_;
+};
+
+}  // namespace kelvo

@@ -1,0 +1,90 @@
+#pragma once
+
+#include "platform/BulletinService.h"
+#include "platform/CallObserver.h"
+#include "platform/DisplayLayout.h"
+#include "platform/IPC.h"
+#include "platform/RestrictionsProfile.h"
+#include "platform/SystemAlert.h"
+
+#include <cerrno>
+#include <memory>
+
+/// Services that this Linux device does not have (yet): each answers as a device would on which the thing in
+/// question never happens. All are thread-safe, having no state.
+namespace kelvo {
+
+/// A device that nobody calls.
+class SilentCallObserver : public CallObserver {
+  public:
+    void setDelegate(std::weak_ptr<CallObserverDelegate>) override {}
+};
+
+/// A device without an administrator's restrictions.
+class UnrestrictedProfile : public RestrictionsProfile {
+  public:
+    void addObserver(std::weak_ptr<RestrictionsObserver>) override {}
+    void removeObserver(const RestrictionsObserver*) override {}
+    RestrictionSetting effectiveSetting(std::string_view) override { return RestrictionSetting::unspecified; }
+};
+
+/// A display that shows one application, always.
+class UnchangingDisplayLayout : public DisplayLayoutService {
+  public:
+    std::shared_ptr<DisplayLayoutMonitor> createMonitor(int) override { return std::make_shared<Monitor>(); }
+
+  private:
+    class Monitor : public DisplayLayoutMonitor {
+      public:
+        DisplayLayout currentLayout() override { return {{DisplayLayout::Element{0}}}; }
+        void addObserver(std::weak_ptr<DisplayLayoutObserver>) override {}
+        void removeObserver(const DisplayLayoutObserver*) override {}
+        void invalidate() override {}
+    };
+};
+
+/// A bulletin service that shows nothing.
+class InvisibleBulletins : public BulletinService {
+  public:
+    std::shared_ptr<BulletinConnection> connect(std::string_view, SerialQueue&) override {
+        return std::make_shared<Connection>();
+    }
+
+  private:
+    class Proxy : public BulletinProxy {
+      public:
+        void withdrawAllBulletins() override {}
+    };
+    class Connection : public BulletinConnection {
+      public:
+        std::shared_ptr<BulletinProxy> registerDataProvider(std::weak_ptr<BulletinDataProvider>) override {
+            return std::make_shared<Proxy>();
+        }
+    };
+};
+
+/// A device without a shell that could show an alert.
+class ShelllessAlerts : public SystemAlertService {
+  public:
+    Result<std::shared_ptr<SystemAlert>> createAlert(const SystemAlertContent&) override {
+        return KVError::posix(ENOSYS, "no system shell shows alerts");
+    }
+};
+
+/// A transport that no client can reach.
+class UnreachableTransport : public IPCTransport {
+  public:
+    std::shared_ptr<IPCListener> createListener(std::string_view) override {
+        return std::make_shared<Listener>();
+    }
+    std::shared_ptr<IPCConnection> currentConnection() override { return nullptr; }
+
+  private:
+    class Listener : public IPCListener {
+      public:
+        void setDelegate(std::weak_ptr<IPCListenerDelegate>) override {}
+        void resume() override {}
+    };
+};
+
+}  // namespace kelvo

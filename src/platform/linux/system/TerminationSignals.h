@@ -1,0 +1,28 @@
+#pragma once
+
+#include "base/UniqueFd.h"
+
+#include <functional>
+#include <thread>
+
+namespace kelvo {
+
+/// Turns SIGTERM and SIGINT into a call. Made first thing in `main`, before any other thread starts, so that
+/// no thread is interrupted by them; ignores SIGPIPE, too, whose cause every write reports anyway.
+class TerminationSignals {
+  public:
+    TerminationSignals();
+    ~TerminationSignals();
+    TerminationSignals(const TerminationSignals&) = delete;
+    TerminationSignals& operator=(const TerminationSignals&) = delete;
+
+    /// Runs `handler` for the first signal, on a thread of its own. Once.
+    void watch(std::function<void()> handler);
+
+  private:
+    UniqueFd signals_;
+    UniqueFd stopEvent_;
+    std::thread watcher_;
+};
+
+}  // namespace kelvo
