@@ -45,3 +45,10 @@ function(kelvo_test name)
     target_link_libraries(${name} PRIVATE kelvo_settings ${ARG_DEPENDS} kelvo_test_support)
     gtest_discover_tests(${name} DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 120)
 endfunction()
+
+# kelvo_loads_modules(TARGET): the program TARGET may load our modules, which use its base library: all of it is
+# linked in and exported.
+function(kelvo_loads_modules target)
+    set_target_properties(${target} PROPERTIES ENABLE_EXPORTS ON
+        LINK_LIBRARY_OVERRIDE "WHOLE_ARCHIVE,kelvo_base")
+endfunction()
