@@ -12,7 +12,9 @@
 #include "platform/NotificationCenter.h"
 #include "platform/Preferences.h"
 #include "platform/Random.h"
+#include "platform/RenderServer.h"
 #include "platform/RestrictionsProfile.h"
+#include "platform/ScreenCapture.h"
 #include "platform/StoragePurgeService.h"
 #include "platform/SystemAlert.h"
 #include "platform/TextFolding.h"
@@ -39,6 +41,9 @@ struct Platform {
     std::shared_ptr<CallObserver> calls;
     std::shared_ptr<RestrictionsProfile> restrictions;
     std::shared_ptr<DisplayLayoutService> displayLayout;
+    std::shared_ptr<ScreenCaptureService> screenCapture;
+    std::shared_ptr<DisplayMirroring> displayMirroring;
+    std::shared_ptr<RenderServer> renderServer;
     std::shared_ptr<BulletinService> bulletins;
     std::shared_ptr<SystemAlertService> alerts;
     std::shared_ptr<IPCTransport> ipc;

@@ -8,6 +8,7 @@
 #include "platform/simulated/SimulatedFileSystem.h"
 #include "platform/simulated/SimulatedIPC.h"
 #include "platform/simulated/SimulatedNotifications.h"
+#include "platform/simulated/SimulatedScreen.h"
 #include "platform/simulated/SimulatedSettings.h"
 #include "platform/simulated/SimulatedShell.h"
 #include "platform/simulated/SimulatedStoragePurge.h"
@@ -42,7 +43,7 @@ class SimulatedDevice {
 
     /// Runs main-queue tasks, due timers and global-queue work until none is left.
     void settle();
-    /// Moves the clock and settles.
+    /// Moves the clock, lets the screen deliver what that made due, and settles.
     void advance(std::chrono::nanoseconds interval);
 
     /// The screen goes blank or comes back.
@@ -88,6 +89,8 @@ class SimulatedDevice {
     const std::shared_ptr<SimulatedCallObserver> calls;
     const std::shared_ptr<SimulatedRestrictions> restrictions;
     const std::shared_ptr<SimulatedDisplayLayout> displayLayout;
+    const std::shared_ptr<SimulatedScreen> screen;
+    const std::shared_ptr<SimulatedRenderServer> renderServer;
     const std::shared_ptr<SimulatedBulletins> bulletins;
     const std::shared_ptr<SimulatedAlerts> alerts;
     const std::shared_ptr<SimulatedIPC> ipc;
