@@ -33,8 +33,9 @@ class SimulatedBundle : public Bundle {
         const auto entry = content_.tables.find(std::string(localization));
         if (type != "strings" || entry == content_.tables.end()) return std::nullopt;
         if (!entry->second.contains(std::string(name))) return std::nullopt;
-        return path_ + "/" + std::string(localization) + std::string(kLocalizationSuffix) + "/" +
-               std::string(name) + ".strings";
+        std::string path = path_;
+        path.append("/").append(localization).append(kLocalizationSuffix).append("/").append(name).append(".strings");
+        return path;
     }
 
     std::optional<std::string> localizedString(std::string_view key, std::string_view table) const override {

@@ -72,7 +72,7 @@ void SimulatedDevice::setLayout(const std::vector<int>& levels) {
     DisplayLayout layout;
     for (const int level : levels)
         layout.elements.push_back({level});
-    displayLayout->change(std::move(layout));
+    displayLayout->change(layout);
 }
 
 }  // namespace kelvo

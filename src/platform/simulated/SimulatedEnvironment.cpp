@@ -65,7 +65,7 @@ std::shared_ptr<DisplayLayoutMonitor> SimulatedDisplayLayout::createMonitor(int)
     return lastMonitor_;
 }
 
-void SimulatedDisplayLayout::change(DisplayLayout layout) {
+void SimulatedDisplayLayout::change(const DisplayLayout& layout) {
     shared_->layout.set(layout);
     for (const auto& [key, weak] : shared_->observers.copy()) {
         if (const auto observer = weak.lock())

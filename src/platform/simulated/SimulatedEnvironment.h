@@ -49,7 +49,7 @@ class SimulatedDisplayLayout : public DisplayLayoutService {
   public:
     std::shared_ptr<DisplayLayoutMonitor> createMonitor(int displayType) override;
 
-    void change(DisplayLayout layout);
+    void change(const DisplayLayout& layout);
     int monitorCount() const { return shared_->monitorCount.copy(); }
     std::size_t observerCount() const;
     bool isAnyMonitorInvalidated() const { return shared_->invalidated.copy(); }

@@ -92,7 +92,7 @@ class InfoReader : public nlohmann::json_sax<Json> {
 
     bool take(Value value) {
         if (depth_ == 0) return fail("not an object");
-        if (depth_ == kRootDepth) return takeAtRoot(std::move(value));
+        if (depth_ == kRootDepth) return takeAtRoot(value);
         if (section_ == nullptr || depth_ > kSectionDepth + (array_ ? 1 : 0)) return true;
         if (++entryCount_ > BundleInfo::kMostEntries) return fail("too many entries");
         if (array_) {
@@ -103,7 +103,7 @@ class InfoReader : public nlohmann::json_sax<Json> {
         return true;
     }
 
-    bool takeAtRoot(Value value) {
+    bool takeAtRoot(const Value& value) {
         if (sectionNamed(key_) != nullptr) return fail(key_ + " is not an object");
         if (!knowsScalar()) return true;
         const std::string* text = value.asString();

@@ -40,7 +40,7 @@ std::string DeviceRoot::hostPath(std::string_view devicePath) const {
 }
 
 std::string DeviceRoot::hostPathForReading(std::string_view devicePath) const {
-    const std::string own = hostPath(devicePath);
+    std::string own = hostPath(devicePath);
     std::error_code ignored;
     if (!devicePath.starts_with(kSystemPrefix) || fs::exists(own, ignored)) return own;
     const std::string part = resourcePart(fs::path(devicePath).lexically_normal());
@@ -48,7 +48,7 @@ std::string DeviceRoot::hostPathForReading(std::string_view devicePath) const {
 }
 
 std::string DeviceRoot::devicePath(std::string_view hostPath) const {
-    const std::string normal = fs::path(hostPath).lexically_normal().string();
+    std::string normal = fs::path(hostPath).lexically_normal().string();
     if (root_.empty()) return normal;
     if (normal.starts_with(root_ + "/")) return normal.substr(root_.size());
     return std::string(kHostPrefix.substr(0, kHostPrefix.size() - 1)) + normal;
