@@ -9,6 +9,7 @@
 #include "platform/DisplayLayout.h"
 #include "platform/FileSystem.h"
 #include "platform/IPC.h"
+#include "platform/MediaService.h"
 #include "platform/NotificationCenter.h"
 #include "platform/Preferences.h"
 #include "platform/Random.h"
@@ -47,6 +48,7 @@ struct Platform {
     std::shared_ptr<BulletinService> bulletins;
     std::shared_ptr<SystemAlertService> alerts;
     std::shared_ptr<IPCTransport> ipc;
+    std::shared_ptr<MediaService> media;
 };
 
 }  // namespace kelvo

@@ -24,7 +24,8 @@ SimulatedDevice::SimulatedDevice()
       renderServer(std::make_shared<SimulatedRenderServer>()),
       bulletins(std::make_shared<SimulatedBulletins>()),
       alerts(std::make_shared<SimulatedAlerts>(faults)),
-      ipc(std::make_shared<SimulatedIPC>()) {}
+      ipc(std::make_shared<SimulatedIPC>()),
+      media(std::make_shared<SimulatedMedia>(fileSystem, faults)) {}
 
 Platform SimulatedDevice::platform() const {
     Platform platform;
@@ -48,6 +49,7 @@ Platform SimulatedDevice::platform() const {
     platform.bulletins = bulletins;
     platform.alerts = alerts;
     platform.ipc = ipc;
+    platform.media = media;
     return platform;
 }
 

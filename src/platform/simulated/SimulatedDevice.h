@@ -7,6 +7,7 @@
 #include "platform/simulated/SimulatedFaults.h"
 #include "platform/simulated/SimulatedFileSystem.h"
 #include "platform/simulated/SimulatedIPC.h"
+#include "platform/simulated/SimulatedMedia.h"
 #include "platform/simulated/SimulatedNotifications.h"
 #include "platform/simulated/SimulatedScreen.h"
 #include "platform/simulated/SimulatedSettings.h"
@@ -94,6 +95,7 @@ class SimulatedDevice {
     const std::shared_ptr<SimulatedBulletins> bulletins;
     const std::shared_ptr<SimulatedAlerts> alerts;
     const std::shared_ptr<SimulatedIPC> ipc;
+    const std::shared_ptr<SimulatedMedia> media;
 };
 
 }  // namespace kelvo

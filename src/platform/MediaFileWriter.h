@@ -1,0 +1,56 @@
+#pragma once
+
+#include "base/KVError.h"
+#include "base/MediaTime.h"
+#include "platform/WriterInput.h"
+
+#include <functional>
+#include <memory>
+#include <optional>
+
+namespace kelvo {
+
+/// The kinds of movie file that are written.
+enum class MediaFileType { mpeg4 };
+
+/// Writes one movie file from the samples given to its inputs. Implemented by the Linux media adapter and the
+/// simulated device; driven by a movie writer. Thread-safe.
+///
+/// Order of calls: `addInput` for each track, `startWriting`, `startSession`, samples to the inputs,
+/// optionally `endSession`, `finishWriting`. A writer serves one file. One that is destroyed before it
+/// finished leaves the file as it lies, playable up to its last fragment.
+class MediaFileWriter {
+  public:
+    /// The numbers are the ones that logs show.
+    enum class Status { unknown = 0, writing = 1, completed = 2, failed = 3, cancelled = 4 };
+
+    virtual ~MediaFileWriter() = default;
+
+    /// Ignored once the writer has started.
+    virtual void addInput(std::shared_ptr<WriterInput> input) = 0;
+
+    virtual Status status() const = 0;
+
+    /// Why the writer failed; none unless it did.
+    virtual OptionalError error() const = 0;
+
+    /// Where the movie lies, or will.
+    virtual std::optional<URL> outputURL() const = 0;
+
+    /// Creates the file (nothing may stand at its path) and opens the encoders. False when that fails, which
+    /// also fails the writer, and false without any effect when it was called before.
+    virtual bool startWriting() = 0;
+
+    /// The movie's timeline begins at `sourceTime`: what lies before it is not in the movie.
+    virtual void startSession(const MediaTime& sourceTime) = 0;
+
+    /// The movie ends at `sourceTime`: what lies at or after it is not in the movie, whether it was appended
+    /// already or not.
+    virtual void endSession(const MediaTime& sourceTime) = 0;
+
+    /// Takes no more samples, writes what was appended and completes the file. `completion` runs once, on a
+    /// queue of the writer's own; the status is then completed or failed.
+    virtual void finishWriting(std::function<void()> completion) = 0;
+};
+
+}  // namespace kelvo
