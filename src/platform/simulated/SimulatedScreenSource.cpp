@@ -24,7 +24,7 @@ VideoSurface::Geometry frameGeometry(const Size& screen, Size limit) {
 
 SimulatedScreenSource::SimulatedScreenSource(SimulatedScreen& screen, const Size& size,
                                              std::chrono::nanoseconds interval)
-    : screen_(screen), size_(size), pacer_(interval) {}
+    : screen_(screen), size_(size), interval_(interval) {}
 
 void SimulatedScreenSource::setDelegate(std::weak_ptr<ScreenCaptureDelegate> delegate) {
     delegate_.set(std::move(delegate));
@@ -39,15 +39,9 @@ void SimulatedScreenSource::onQueue(const Task& task) {
 }
 
 void SimulatedScreenSource::startCapture() {
-    if (isRunning_.exchange(true)) return;
-    // Not waited for: the first frame comes on another thread, as it does from a real screen.
-    queue_.async([weak = weak_from_this()] {
-        const auto self = weak.lock();
-        if (!self) return;
-        self->deliveredChange_ = 0;
-        self->startedAt_ = self->screen_.clock_->monotonicNow();
-        self->catchUp();
-    });
+    if (isRunning_) return;
+    isFresh_ = true;
+    isRunning_ = true;
 }
 
 void SimulatedScreenSource::stopCapture() {
@@ -57,6 +51,7 @@ void SimulatedScreenSource::stopCapture() {
 
 void SimulatedScreenSource::catchUp() {
     onQueue([this] {
+        if (isFresh_.exchange(false)) beginAnew();
         const SimulatedScreen::Picture picture = screen_.picture();
         const bool isNews = picture.change != deliveredChange_ && picture.mode != MirroringMode::off;
         const auto changedAt = std::max(picture.changedAt, startedAt_);
@@ -71,11 +66,17 @@ void SimulatedScreenSource::catchUp() {
     });
 }
 
+void SimulatedScreenSource::beginAnew() {
+    pacer_.emplace(interval_);
+    deliveredChange_ = 0;
+    startedAt_ = screen_.clock_->monotonicNow();
+}
+
 bool SimulatedScreenSource::takeTurn(std::chrono::nanoseconds changedAt) {
     const auto now = screen_.clock_->monotonicNow();
-    const auto due = pacer_.due(changedAt);
+    const auto due = pacer_->due(changedAt);
     if (due > now) return false;
-    pacer_.captured(due, now);
+    pacer_->captured(due, now);
     return true;
 }
 
