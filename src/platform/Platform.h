@@ -2,6 +2,7 @@
 
 #include "base/Clock.h"
 #include "base/MainQueue.h"
+#include "platform/AnalyticsSink.h"
 #include "platform/BulletinService.h"
 #include "platform/Bundles.h"
 #include "platform/CallObserver.h"
@@ -45,6 +46,7 @@ struct Platform {
     std::shared_ptr<ScreenCaptureService> screenCapture;
     std::shared_ptr<DisplayMirroring> displayMirroring;
     std::shared_ptr<RenderServer> renderServer;
+    std::shared_ptr<AnalyticsSink> analytics;
     std::shared_ptr<BulletinService> bulletins;
     std::shared_ptr<SystemAlertService> alerts;
     std::shared_ptr<IPCTransport> ipc;

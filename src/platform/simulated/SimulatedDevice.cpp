@@ -22,6 +22,7 @@ SimulatedDevice::SimulatedDevice()
       displayLayout(std::make_shared<SimulatedDisplayLayout>()),
       screen(std::make_shared<SimulatedScreen>(clock)),
       renderServer(std::make_shared<SimulatedRenderServer>()),
+      analytics(std::make_shared<SimulatedAnalytics>(faults)),
       bulletins(std::make_shared<SimulatedBulletins>()),
       alerts(std::make_shared<SimulatedAlerts>(faults)),
       ipc(std::make_shared<SimulatedIPC>()),
@@ -46,6 +47,7 @@ Platform SimulatedDevice::platform() const {
     platform.screenCapture = screen;
     platform.displayMirroring = screen;
     platform.renderServer = renderServer;
+    platform.analytics = analytics;
     platform.bulletins = bulletins;
     platform.alerts = alerts;
     platform.ipc = ipc;

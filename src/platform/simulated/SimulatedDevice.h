@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/Platform.h"
+#include "platform/simulated/SimulatedAnalytics.h"
 #include "platform/simulated/SimulatedBundles.h"
 #include "platform/simulated/SimulatedClock.h"
 #include "platform/simulated/SimulatedEnvironment.h"
@@ -92,6 +93,7 @@ class SimulatedDevice {
     const std::shared_ptr<SimulatedDisplayLayout> displayLayout;
     const std::shared_ptr<SimulatedScreen> screen;
     const std::shared_ptr<SimulatedRenderServer> renderServer;
+    const std::shared_ptr<SimulatedAnalytics> analytics;
     const std::shared_ptr<SimulatedBulletins> bulletins;
     const std::shared_ptr<SimulatedAlerts> alerts;
     const std::shared_ptr<SimulatedIPC> ipc;
