@@ -1,5 +1,6 @@
 #pragma once
 
+#include <array>
 #include <span>
 #include <string>
 #include <string_view>
@@ -14,7 +15,7 @@ std::string formatLocalized(std::string_view format, std::span<const std::string
 
 template <typename... Texts>
 std::string formatLocalized(std::string_view format, const Texts&... texts) {
-    const std::string_view arguments[] = {std::string_view(texts)...};
+    const std::array<std::string_view, sizeof...(Texts)> arguments{std::string_view(texts)...};
     return formatLocalized(format, std::span<const std::string_view>(arguments));
 }
 

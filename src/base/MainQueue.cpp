@@ -30,7 +30,8 @@ void MainQueue::sync(const Task& task) {
         taskRan_.notify_all();
     });
     wakes_.notify_one();
-    taskRan_.wait(lock, [&] { return *hasRun || (stopped_ && tasks_.empty()); });
+    // A dropped task neither waits any more nor is the one that runs.
+    taskRan_.wait(lock, [&] { return *hasRun || (stopped_ && tasks_.empty() && runningTasks_ == 0); });
 }
 
 std::shared_ptr<RepeatingTimer> MainQueue::scheduleRepeating(std::chrono::nanoseconds period, Task task) {
@@ -48,17 +49,21 @@ void MainQueue::run() {
     while (!stopped_) {
         if (!runOneTask(lock) && !runDueTimers(lock)) waitForWork(lock);
     }
-    tasks_.clear();
-    taskRan_.notify_all();
     loopThread_ = {};
+    dropTasks(lock);
 }
 
 void MainQueue::stop() {
-    std::lock_guard lock(mutex_);
+    std::unique_lock lock(mutex_);
     stopped_ = true;
-    if (loopThread_ == std::thread::id()) tasks_.clear();
     wakes_.notify_all();
+    if (loopThread_ == std::thread::id()) dropTasks(lock);
+}
+
+void MainQueue::dropTasks(std::unique_lock<std::mutex>& lock) {
+    const std::deque<Task> dropped = std::exchange(tasks_, {});
     taskRan_.notify_all();
+    lock.unlock();  // what the tasks hold may call this queue as it goes
 }
 
 std::size_t MainQueue::runUntilIdle() {
@@ -68,6 +73,7 @@ std::size_t MainQueue::runUntilIdle() {
     while (!stopped_ && (runOneTask(lock) || runDueTimers(lock)))
         ++count;
     loopThread_ = outer;
+    if (stopped_ && outer == std::thread::id()) dropTasks(lock);
     return count;
 }
 
@@ -80,22 +86,26 @@ bool MainQueue::runOneTask(std::unique_lock<std::mutex>& lock) {
     if (tasks_.empty()) return false;
     Task task = std::move(tasks_.front());
     tasks_.pop_front();
+    ++runningTasks_;
     lock.unlock();
     task();
     task = nullptr;
     lock.lock();
+    --runningTasks_;
     return true;
 }
 
 bool MainQueue::runDueTimers(std::unique_lock<std::mutex>& lock) {
-    const std::shared_ptr<RepeatingTimer> timer = earliestTimer();
+    std::shared_ptr<RepeatingTimer> timer = earliestTimer();
     const std::chrono::nanoseconds now = clock_.monotonicNow();
     if (!timer || timer->due_ > now) return false;
     const auto missed = (now - timer->due_) / timer->period_;
     timer->due_ += (missed + 1) * timer->period_;
-    const Task task = timer->task_;  // a copy: the task may invalidate its own timer
+    Task task = timer->task_;  // a copy: the task may invalidate its own timer
     lock.unlock();
     if (task) task();
+    task = nullptr;  // what they hold may call this queue as it goes
+    timer = nullptr;
     lock.lock();
     return true;
 }

@@ -66,6 +66,8 @@ class MainQueue {
     bool runDueTimers(std::unique_lock<std::mutex>& lock);
     std::shared_ptr<RepeatingTimer> earliestTimer();
     void waitForWork(std::unique_lock<std::mutex>& lock);
+    /// Gives `lock` up.
+    void dropTasks(std::unique_lock<std::mutex>& lock);
 
     const Clock& clock_;
     mutable std::mutex mutex_;
@@ -73,6 +75,7 @@ class MainQueue {
     std::condition_variable taskRan_;
     std::deque<Task> tasks_;
     std::vector<std::weak_ptr<RepeatingTimer>> timers_;
+    std::size_t runningTasks_ = 0;  // more than one when a task runs the loop itself
     std::thread::id loopThread_;
     bool stopped_ = false;
 };

@@ -83,7 +83,7 @@ class SerialQueue::State {
             workerWakes_.notify_one();
         }
         if (!worker.joinable()) return;
-        if (worker.get_id() == std::this_thread::get_id()) {
+        if (isCurrent()) {
             worker.detach();  // the last reference went in one of our own tasks; the state lives on with the
                               // thread
         } else {
@@ -111,7 +111,10 @@ class SerialQueue::State {
     /// Under the lock, by the holder of the token (or by anyone while nobody holds it).
     void passToken() {
         busy_ = !items_.empty();
-        if (!busy_) return;
+        if (!busy_) {
+            if (finishing_) workerWakes_.notify_one();  // a `sync` task let the queue go: nothing follows it
+            return;
+        }
         if (Turn* turn = items_.front().turn; turn != nullptr) {
             items_.pop_front();
             turn->isGranted = true;
@@ -171,7 +174,8 @@ void SerialQueue::async(Task task) {
     state_->async(std::move(task), state_);
 }
 void SerialQueue::sync(const Task& task) {
-    state_->sync(task);
+    const std::shared_ptr<State> state = state_;  // the task may let the last reference to this queue go
+    state->sync(task);
 }
 
 }  // namespace kelvo

@@ -75,17 +75,18 @@ SessionRef KVSessionManager::getCurrentRecordingSession() const {
     return nullptr;
 }
 
-std::set<SessionRef> KVSessionManager::getActiveRecordingSessions() const {
-    std::set<SessionRef> active = getActiveInAppRecordingSessions();
-    if (SessionRef system = getSystemRecordingSession(); isActive(system)) active.insert(system);
+std::vector<SessionRef> KVSessionManager::getActiveRecordingSessions() const {
+    std::vector<SessionRef> active = getActiveInAppRecordingSessions();
+    if (SessionRef system = getSystemRecordingSession(); isActive(system))
+        active.insert(active.begin(), system);
     return active;
 }
 
-std::set<SessionRef> KVSessionManager::getActiveInAppRecordingSessions() const {
-    std::set<SessionRef> active;
+std::vector<SessionRef> KVSessionManager::getActiveInAppRecordingSessions() const {
+    std::vector<SessionRef> active;
     const auto registry = registry_.copy();
     for (const auto& [bundleIdentifier, session] : registry.bundleIDToRecordingSessionLookup) {
-        if (isActive(session)) active.insert(session);
+        if (isActive(session)) active.push_back(session);
     }
     return active;
 }
@@ -184,8 +185,8 @@ void KVSessionManager::stopInAppRecordingSessionsBecauseOfMultitasking() {
 void KVSessionManager::interruptOtherRecordingSessionAgainstSession(const SessionRef& session) {
     // The text names the recording manager although the work is done here; readers of logs know it so.
     KVLog("KVRecordingManager:interruptRecordingSessions");
-    std::set<SessionRef> others = getActiveRecordingSessions();
-    others.erase(session);
+    std::vector<SessionRef> others = getActiveRecordingSessions();
+    std::erase(others, session);
     for (const SessionRef& other : others) {
         other->finishSessionWithHandler([this, other](const auto& movieURL, const auto& error) {
             KVLog("interrupted session");

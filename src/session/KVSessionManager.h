@@ -8,9 +8,9 @@
 #include <cstdint>
 #include <map>
 #include <memory>
-#include <set>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace kelvo {
 
@@ -38,8 +38,9 @@ class KVSessionManager {
     SessionRef getSystemRecordingSession() const;
     /// The system session when it is recording, else the first in-app session that is, else none.
     SessionRef getCurrentRecordingSession() const;
-    std::set<SessionRef> getActiveRecordingSessions() const;
-    std::set<SessionRef> getActiveInAppRecordingSessions() const;
+    /// The system session first, then the in-app ones; each stands once.
+    std::vector<SessionRef> getActiveRecordingSessions() const;
+    std::vector<SessionRef> getActiveInAppRecordingSessions() const;
 
     static bool clientEligibleForSystemRecordingWithBundleIdentifier(std::string_view bundleIdentifier);
     void removeInAppSessionWithBundleIdentifier(const std::string& bundleIdentifier);

@@ -1,9 +1,9 @@
+#include "platform/linux/bundles/BundleInfo.h"
+
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
 #include <string_view>
-
-#include "platform/linux/bundles/BundleInfo.h"
 
 /// Any bytes are a bundle's description, within its bounds, or an error.
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {

@@ -1,9 +1,9 @@
+#include "platform/linux/bundles/StringsTable.h"
+
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
 #include <string>
-
-#include "platform/linux/bundles/StringsTable.h"
 
 /// Any bytes are a table or an error; every key of a table is found.
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {

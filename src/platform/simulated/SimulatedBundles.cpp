@@ -34,7 +34,12 @@ class SimulatedBundle : public Bundle {
         if (type != "strings" || entry == content_.tables.end()) return std::nullopt;
         if (!entry->second.contains(std::string(name))) return std::nullopt;
         std::string path = path_;
-        path.append("/").append(localization).append(kLocalizationSuffix).append("/").append(name).append(".strings");
+        path.append("/")
+            .append(localization)
+            .append(kLocalizationSuffix)
+            .append("/")
+            .append(name)
+            .append(".strings");
         return path;
     }
 
@@ -63,7 +68,9 @@ void SimulatedBundles::addBundle(const std::string& path, SimulatedBundleContent
             if (localization.empty()) continue;
             SimulatedBundleContent folder;
             folder.tables[""] = tables;
-            world.bundles[path + "/" + localization + std::string(kLocalizationSuffix)] = std::move(folder);
+            std::string place = path;
+            place.append("/").append(localization).append(kLocalizationSuffix);
+            world.bundles[place] = std::move(folder);
         }
         world.bundles[path] = std::move(content);
     });
@@ -95,6 +102,7 @@ BundleRef SimulatedBundles::bundleAtPath(std::string_view path) {
 }
 
 BundleRef SimulatedBundles::bundleWithIdentifier(std::string_view bundleIdentifier) {
+    if (bundleIdentifier.empty()) return nullptr;  // a localization's folder has none
     return world_.with([&](World& world) -> BundleRef {
         for (const auto& [path, content] : world.bundles) {
             if (content.bundleIdentifier == bundleIdentifier)

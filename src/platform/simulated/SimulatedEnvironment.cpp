@@ -61,15 +61,17 @@ class SimulatedDisplayLayout::Monitor : public DisplayLayoutMonitor {
 
 std::shared_ptr<DisplayLayoutMonitor> SimulatedDisplayLayout::createMonitor(int) {
     shared_->monitorCount.with([](int& count) { ++count; });
-    lastMonitor_ = std::make_shared<Monitor>(shared_);
-    return lastMonitor_;
+    auto monitor = std::make_shared<Monitor>(shared_);
+    lastMonitor_.set(monitor);
+    return monitor;
 }
 
 void SimulatedDisplayLayout::change(const DisplayLayout& layout) {
     shared_->layout.set(layout);
+    const std::shared_ptr<DisplayLayoutMonitor> monitor = lastMonitor_.copy();
     for (const auto& [key, weak] : shared_->observers.copy()) {
         if (const auto observer = weak.lock())
-            observer->layoutMonitorDidUpdateDisplayLayout(*lastMonitor_, layout);
+            observer->layoutMonitorDidUpdateDisplayLayout(*monitor, layout);
     }
 }
 

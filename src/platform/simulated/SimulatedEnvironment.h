@@ -63,7 +63,7 @@ class SimulatedDisplayLayout : public DisplayLayoutService {
         Guarded<bool> invalidated;
     };
     std::shared_ptr<Shared> shared_ = std::make_shared<Shared>();
-    std::shared_ptr<DisplayLayoutMonitor> lastMonitor_;
+    Guarded<std::shared_ptr<DisplayLayoutMonitor>> lastMonitor_;
 };
 
 }  // namespace kelvo

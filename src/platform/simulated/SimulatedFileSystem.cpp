@@ -8,9 +8,9 @@ namespace {
 
 constexpr std::uint64_t kDirectorySize = 4096;
 
-/// `path` with single slashes and none at its end.
+/// `path` from the root on, with single slashes and none at its end.
 std::string normalized(std::string_view path) {
-    std::string result;
+    std::string result = "/";
     for (const char character : path) {
         if (character == '/' && !result.empty() && result.back() == '/') continue;
         result += character;

@@ -82,7 +82,7 @@ class X11ScreenUnderTest : public ScreenUnderTest {
         client_.place(window_, {0, 0, width, height});
     }
     void wait(std::chrono::milliseconds time) override { std::this_thread::sleep_for(time); }
-    void die() override { server_.process().kill(); }
+    void die() override { server_.kill(); }
     std::chrono::nanoseconds now() override { return std::chrono::steady_clock::now().time_since_epoch(); }
     bool eventually(const std::function<bool()>& condition) override { return test::eventually(condition); }
 

@@ -1,45 +1,34 @@
 #include "support/x11/XvfbServer.h"
 
-#include "base/UniqueFd.h"
-
-#include <array>
-#include <fcntl.h>
+#include <csignal>
 #include <sys/stat.h>
-#include <unistd.h>
 
 namespace kelvo::test {
-namespace {
-
-/// Reads up to the end of the first line; empty when the writer ends before it.
-std::string readLine(int descriptor) {
-    std::string line;
-    char character = 0;
-    while (::read(descriptor, &character, 1) == 1) {
-        if (character == '\n') return line;
-        line += character;
-    }
-    return {};
-}
-
-}  // namespace
 
 XvfbServer::XvfbServer(int width, int height, const std::string& display) {
     // Servers that start at once race to make the folder of their sockets.
     ::mkdir("/tmp/.X11-unix", 01777);
     ::chmod("/tmp/.X11-unix", 01777);
-    std::array<int, 2> ends{};
-    if (::pipe2(ends.data(), O_CLOEXEC) != 0) return;
-    const UniqueFd readEnd(ends[0]);
-    UniqueFd writeEnd(ends[1]);
-    const std::string mode = std::to_string(width) + "x" + std::to_string(height) + "x24";
-    std::vector<std::string> command{"Xvfb",      "-displayfd", std::to_string(writeEnd.get()),
-                                     "-screen",   "0",          mode,
-                                     "-nolisten", "tcp",        "-noreset"};
-    if (!display.empty()) command.insert(command.begin() + 1, display);
-    process_ = std::make_unique<ChildProcess>(command, std::vector<int>{writeEnd.get()});
-    writeEnd.reset();
-    const std::string number = readLine(readEnd.get());
-    if (!number.empty()) display_ = ":" + number;
+    // The server writes its number, and nothing else, to where the test reads.
+    const std::string command = "exec Xvfb " + display + " -displayfd 3 -screen 0 " + std::to_string(width) + "x" +
+                                std::to_string(height) + "x24 -nolisten tcp -noreset 3>&2 2>/dev/null";
+    process_ = std::make_unique<ChildProcess>(std::vector<std::string>{"sh", "-c", command});
+    if (!process_->waitForLine("\n")) return;
+    const std::string& answer = process_->output();
+    display_ = ":" + answer.substr(0, answer.find('\n'));
+}
+
+void XvfbServer::kill() {
+    process_->signal(SIGKILL);
+    process_->waitForExit();
+}
+
+void XvfbServer::freeze() {
+    process_->signal(SIGSTOP);
+}
+
+void XvfbServer::thaw() {
+    process_->signal(SIGCONT);
 }
 
 }  // namespace kelvo::test

@@ -16,7 +16,11 @@ class XvfbServer {
 
     /// ":N"; empty when the server did not come up.
     const std::string& display() const { return display_; }
-    ChildProcess& process() { return *process_; }
+
+    /// SIGKILL, waiting for the end; SIGSTOP; SIGCONT.
+    void kill();
+    void freeze();
+    void thaw();
 
   private:
     std::string display_;

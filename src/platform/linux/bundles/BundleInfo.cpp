@@ -10,21 +10,23 @@ namespace kelvo {
 namespace {
 
 constexpr std::size_t kDeepestNesting = 32;
-constexpr std::size_t kLongestString = 4096;
+constexpr std::size_t kLongestToken = 4096;
 constexpr std::size_t kRootDepth = 1;
 constexpr std::size_t kSectionDepth = 2;
 
 using Json = nlohmann::json;
 
-/// The parser keeps the string that it reads, so an endless one is refused before it starts.
-bool hasEndlessString(std::string_view json) {
+/// The parser keeps the text or number that it reads, so an endless one is refused before it starts.
+bool hasEndlessToken(std::string_view json) {
     bool isInside = false;
     std::size_t length = 0;
     for (std::size_t i = 0; i < json.size(); ++i) {
-        if (json[i] == '"') {
-            isInside = !isInside;
+        const bool isQuote = json[i] == '"';
+        if (isQuote) isInside = !isInside;
+        if (isQuote ||
+            (!isInside && std::string_view(",:[]{} \t\r\n").find(json[i]) != std::string_view::npos)) {
             length = 0;
-        } else if (isInside && ++length > kLongestString) {
+        } else if (++length > kLongestToken) {
             return true;
         } else if (isInside && json[i] == '\\') {
             ++i;
@@ -59,7 +61,8 @@ class InfoReader : public nlohmann::json_sax<Json> {
         return true;
     }
     bool key(string_t& name) override {
-        (depth_ == kRootDepth ? key_ : sectionKey_) = name;
+        if (depth_ == kRootDepth) key_ = name;
+        if (depth_ == kSectionDepth) sectionKey_ = name;
         return true;
     }
     bool start_array(std::size_t) override {
@@ -143,7 +146,7 @@ class InfoReader : public nlohmann::json_sax<Json> {
 
 Result<BundleInfo> BundleInfo::parse(std::string_view json) {
     if (json.size() > kMostBytes) return malformedFile(0, "the file is too large");
-    if (hasEndlessString(json)) return malformedFile(0, "a text is too long");
+    if (hasEndlessToken(json)) return malformedFile(0, "a text or a number is too long");
     InfoReader reader;
     if (Json::sax_parse(json.begin(), json.end(), &reader)) return std::move(reader.info);
     return malformedFile(0, reader.problem);

@@ -25,8 +25,8 @@ struct BundleInfo {
     Dictionary extension;       ///< of an extension, the same kinds of values
 
     /// Reads the file's text. Fails, saying what is wrong, on anything that is not a JSON object in UTF-8, on
-    /// a known key of the wrong type, and beyond these bounds: 32 levels of nesting, 4096 bytes a string, and
-    /// the two above.
+    /// a known key of the wrong type, and beyond these bounds: 32 levels of nesting, 4096 bytes a text or
+    /// number, and the two above.
     static Result<BundleInfo> parse(std::string_view json);
 };
 

@@ -7,8 +7,11 @@
 namespace kelvo {
 
 VolumeWatcher::VolumeWatcher(std::shared_ptr<FileSystem> fileSystem, std::shared_ptr<Clock> clock,
-                             std::string path)
-    : fileSystem_(std::move(fileSystem)), clock_(std::move(clock)), path_(std::move(path)) {}
+                             std::string path, std::chrono::nanoseconds interval)
+    : fileSystem_(std::move(fileSystem)),
+      clock_(std::move(clock)),
+      path_(std::move(path)),
+      interval_(interval) {}
 
 VolumeWatcher::~VolumeWatcher() {
     {
@@ -28,7 +31,7 @@ void VolumeWatcher::registerCallbacks(std::string_view name, StoragePurgeCallbac
 void VolumeWatcher::watch() {
     nameCurrentThread("kelvo.storage");
     std::unique_lock lock(mutex_);
-    while (!stops_.wait_for(lock, kInterval, [this] { return isStopping_; })) {
+    while (!stops_.wait_for(lock, interval_, [this] { return isStopping_; })) {
         const auto watches = watches_;
         lock.unlock();
         // A volume that cannot be read says nothing about its space.

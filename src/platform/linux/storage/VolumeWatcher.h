@@ -14,14 +14,15 @@
 
 namespace kelvo {
 
-/// Looks at the free space of one volume every ten seconds, on a thread of its own that starts with the first
+/// Looks at the free space of one volume from time to time, on a thread of its own that starts with the first
 /// registration, and asks for space back by the bounds of `SpaceWatch`. Thread-safe.
 class VolumeWatcher : public StoragePurgeService {
   public:
     static constexpr std::chrono::seconds kInterval{10};
 
-    /// Watches the volume that holds the device path `path`.
-    VolumeWatcher(std::shared_ptr<FileSystem> fileSystem, std::shared_ptr<Clock> clock, std::string path);
+    /// Looks every `interval` at the volume that holds the device path `path`.
+    VolumeWatcher(std::shared_ptr<FileSystem> fileSystem, std::shared_ptr<Clock> clock, std::string path,
+                  std::chrono::nanoseconds interval = kInterval);
     ~VolumeWatcher() override;
 
     void registerCallbacks(std::string_view name, StoragePurgeCallbacks callbacks) override;
@@ -32,6 +33,7 @@ class VolumeWatcher : public StoragePurgeService {
     const std::shared_ptr<FileSystem> fileSystem_;
     const std::shared_ptr<Clock> clock_;
     const std::string path_;
+    const std::chrono::nanoseconds interval_;
     std::mutex mutex_;
     std::condition_variable stops_;
     std::map<std::string, std::shared_ptr<SpaceWatch>> watches_;

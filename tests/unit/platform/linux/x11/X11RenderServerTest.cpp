@@ -46,7 +46,7 @@ TEST_F(X11RenderServerTest, RootWindowBelongsToNoClient) {
 }
 
 TEST_F(X11RenderServerTest, WindowManagersFrameBelongsToTheWindowWithin) {
-    test::ChildProcess manager({"env", "DISPLAY=" + server_.display(), "openbox"});
+    test::ChildProcess manager({"openbox"}, {{"DISPLAY", server_.display()}});
     const auto window = client_.createWindow({10, 10, 50, 50}, 0, true);
     ASSERT_TRUE(eventually([&] { return parentOf(window) != client_.root(); }));
     EXPECT_EQ(renderServer_.processIdentifierOfContext(window), ::getpid());
@@ -62,7 +62,7 @@ TEST_F(X11RenderServerTest, DisplayThatCannotBeReachedTellsNothing) {
 TEST_F(X11RenderServerTest, DisplayThatWasReplacedIsAskedAnew) {
     const auto before = client_.createWindow({0, 0, 10, 10}, 0);
     ASSERT_TRUE(renderServer_.processIdentifierOfContext(before));
-    server_.process().kill();
+    server_.kill();
     const test::XvfbServer successor(200, 160, server_.display());
     test::XClient client(successor.display());
     const auto after = client.createWindow({0, 0, 10, 10}, 0);

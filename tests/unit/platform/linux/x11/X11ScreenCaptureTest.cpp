@@ -5,7 +5,6 @@
 #include "support/x11/XvfbServer.h"
 
 #include <chrono>
-#include <csignal>
 #include <cstring>
 #include <filesystem>
 #include <thread>
@@ -75,7 +74,7 @@ TEST_F(X11ScreenCaptureTest, UnreachableDisplayIsReported) {
 
 TEST_F(X11ScreenCaptureTest, SourceCanBeStartedAgainAfterTheDisplayCameBack) {
     ASSERT_TRUE(startAndAwaitFrame());
-    server_.process().kill();
+    server_.kill();
     ASSERT_TRUE(eventually([&] { return !recorder_->failures().empty(); }));
     const auto count = recorder_->count();
     const test::XvfbServer successor(200, 160, server_.display());
@@ -88,7 +87,7 @@ TEST_F(X11ScreenCaptureTest, DisplayThatDiesMidFrameEndsTheSource) {
     ASSERT_TRUE(startAndAwaitFrame());
     for (std::uint32_t number = 0; number < 50; ++number) {
         client_.showNumber(window, number);
-        if (number == 40) server_.process().signal(SIGKILL);
+        if (number == 40) server_.kill();
     }
     EXPECT_TRUE(eventually([&] { return recorder_->failures() == std::vector{ScreenCaptureStatus::lost}; }));
 }
@@ -97,12 +96,12 @@ TEST_F(X11ScreenCaptureTest, DisplayThatStandsStillDoesNotHoldUpStop) {
     const auto window = client_.createWindow({0, 0, 200, 160}, 0);
     ASSERT_TRUE(startAndAwaitFrame());
     client_.showNumber(window, 1);
-    server_.process().signal(SIGSTOP);
+    server_.freeze();
     std::this_thread::sleep_for(50ms);
     const auto begin = std::chrono::steady_clock::now();
     source_->stopCapture();
     EXPECT_LT(std::chrono::steady_clock::now() - begin, 5s);
-    server_.process().signal(SIGCONT);
+    server_.thaw();
 }
 
 TEST_F(X11ScreenCaptureTest, ConsumerThatBlocksForASecondLosesNothingButTime) {
