@@ -1,0 +1,42 @@
+#pragma once
+
+#include "base/KVError.h"
+#include "platform/MediaErrors.h"
+
+#include <memory>
+#include <string>
+#include <string_view>
+
+extern "C" {
+#include <libavcodec/avcodec.h>
+#include <libavformat/avformat.h>
+#include <libavutil/opt.h>
+#include <libswresample/swresample.h>
+}
+
+namespace kelvo {
+
+/// Frees what the libav libraries allocate, each kind in its own way.
+struct LavDeleter {
+    void operator()(AVCodecContext* context) const { avcodec_free_context(&context); }
+    void operator()(AVFormatContext* context) const { avformat_close_input(&context); }
+    void operator()(AVFrame* frame) const { av_frame_free(&frame); }
+    void operator()(AVPacket* packet) const { av_packet_free(&packet); }
+    void operator()(SwrContext* context) const { swr_free(&context); }
+};
+
+using CodecContextPointer = std::unique_ptr<AVCodecContext, LavDeleter>;
+using FormatContextPointer = std::unique_ptr<AVFormatContext, LavDeleter>;
+using FramePointer = std::unique_ptr<AVFrame, LavDeleter>;
+using PacketPointer = std::unique_ptr<AVPacket, LavDeleter>;
+using ResamplerPointer = std::unique_ptr<SwrContext, LavDeleter>;
+
+/// The error for what a libav function returned: in the POSIX domain when it is an errno value, else with
+/// `code`.
+KVError lavError(int result, MediaErrorCode code, std::string_view what);
+
+/// The libraries' own messages are dropped: every failure comes back as an error. Called before their first
+/// use; thread-safe.
+void silenceLav();
+
+}  // namespace kelvo

@@ -1,0 +1,97 @@
+#include "platform/linux/media/SampleEncoder.h"
+
+#include "base/KVLog.h"
+#include "platform/linux/media/AudioAligner.h"
+#include "platform/linux/media/AudioEncoder.h"
+#include "platform/linux/media/FrameConverter.h"
+#include "platform/linux/media/VideoEncoder.h"
+
+#include <cerrno>
+#include <optional>
+
+namespace kelvo {
+namespace {
+
+class VideoSampleEncoder : public SampleEncoder {
+  public:
+    Result<TrackFormat> open(const Dictionary& outputSettings, SampleHandler handler) override;
+    OptionalError encode(const SampleBuffer& sample, const MediaTime& start) override;
+    OptionalError flush() override { return encoder_->flush(handler_); }
+
+  private:
+    SampleHandler handler_;
+    std::unique_ptr<VideoEncoder> encoder_;
+    std::optional<FrameConverter> converter_;
+    std::int64_t lastTime_ = -1;
+};
+
+Result<TrackFormat> VideoSampleEncoder::open(const Dictionary& outputSettings, SampleHandler handler) {
+    const auto settings = VideoSettings::fromOutputSettings(outputSettings);
+    if (!settings) return settings.error();
+    auto encoder = VideoEncoder::open(*settings, VideoEncoder::Purpose::live, {});
+    if (!encoder) return encoder.error();
+    encoder_ = std::move(*encoder);
+    converter_.emplace(settings->width, settings->height);
+    handler_ = std::move(handler);
+    TrackFormat format;
+    format.timescale = VideoEncoder::kTimescale;
+    format.codecConfiguration = encoder_->configuration();
+    format.width = static_cast<std::uint16_t>(settings->width);
+    format.height = static_cast<std::uint16_t>(settings->height);
+    format.hasOwnColours = true;
+    return format;
+}
+
+OptionalError VideoSampleEncoder::encode(const SampleBuffer& sample, const MediaTime& start) {
+    const MediaTime time = (sample.presentationTime() - start).convertedTo(VideoEncoder::kTimescale);
+    // Frames closer than the file's unit fall on one time; so does a clock that stands still.
+    if (!time.isValid() || time.value <= lastTime_) return std::nullopt;
+    lastTime_ = time.value;
+    AVFrame* frame = converter_->convert(*sample.surface());
+    if (frame == nullptr) return KVError::posix(ENOMEM, "video frame");
+    return encoder_->encode(*frame, time.value, handler_);
+}
+
+class AudioSampleEncoder : public SampleEncoder {
+  public:
+    Result<TrackFormat> open(const Dictionary& outputSettings, SampleHandler handler) override;
+    OptionalError encode(const SampleBuffer& sample, const MediaTime& start) override;
+    OptionalError flush() override;
+
+  private:
+    std::unique_ptr<AudioEncoder> encoder_;
+    std::optional<AudioAligner> aligner_;
+    bool complained_ = false;
+};
+
+Result<TrackFormat> AudioSampleEncoder::open(const Dictionary& outputSettings, SampleHandler handler) {
+    const auto settings = AudioSettings::fromOutputSettings(outputSettings);
+    if (!settings) return settings.error();
+    auto encoder = AudioEncoder::open(*settings, std::move(handler));
+    if (!encoder) return encoder.error();
+    encoder_ = std::move(*encoder);
+    aligner_.emplace(settings->sampleRate, *encoder_);
+    return encoder_->trackFormat();
+}
+
+OptionalError AudioSampleEncoder::encode(const SampleBuffer& sample, const MediaTime& start) {
+    auto block = readPcm(sample);
+    if (block) return aligner_->add(std::move(*block), (sample.presentationTime() - start).seconds());
+    if (!complained_) KVLogError("dropping audio: %s", block.error().localizedFailureReason().c_str());
+    complained_ = true;
+    return std::nullopt;
+}
+
+OptionalError AudioSampleEncoder::flush() {
+    const OptionalError error = aligner_->flush();
+    return error ? error : encoder_->flush();
+}
+
+}  // namespace
+
+std::unique_ptr<SampleEncoder> makeSampleEncoder(MediaType type) {
+    if (type == MediaType::video) return std::make_unique<VideoSampleEncoder>();
+    return std::make_unique<AudioSampleEncoder>();
+}
+
+}  // namespace kelvo

@@ -1,0 +1,25 @@
+#pragma once
+
+#include "platform/linux/media/LavMediaService.h"
+#include "support/LogRecorder.h"
+#include "support/media/HostFileSystem.h"
+#include "support/media/MovieProbe.h"
+#include "support/media/TemporaryFolder.h"
+#include "support/media/TestMovie.h"
+
+#include <gtest/gtest.h>
+
+namespace kelvo::test {
+
+/// A folder to write movies in, and the service that writes them.
+class MovieFixture : public ::testing::Test {
+  protected:
+    using Status = MediaFileWriter::Status;
+
+    TemporaryFolder folder;
+    const std::string path = folder / "movie.mp4";
+    LogRecorder log;
+    LavMediaService service{std::make_shared<HostFileSystem>()};
+};
+
+}  // namespace kelvo::test
