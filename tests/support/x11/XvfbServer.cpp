@@ -10,8 +10,8 @@ XvfbServer::XvfbServer(int width, int height, const std::string& display) {
     ::mkdir("/tmp/.X11-unix", 01777);
     ::chmod("/tmp/.X11-unix", 01777);
     // The server writes its number, and nothing else, to where the test reads.
-    const std::string command = "exec Xvfb " + display + " -displayfd 3 -screen 0 " + std::to_string(width) + "x" +
-                                std::to_string(height) + "x24 -nolisten tcp -noreset 3>&2 2>/dev/null";
+    const std::string command = "exec Xvfb " + display + " -displayfd 3 -screen 0 " + std::to_string(width) +
+                                "x" + std::to_string(height) + "x24 -nolisten tcp -noreset 3>&2 2>/dev/null";
     process_ = std::make_unique<ChildProcess>(std::vector<std::string>{"sh", "-c", command});
     if (!process_->waitForLine("\n")) return;
     const std::string& answer = process_->output();
