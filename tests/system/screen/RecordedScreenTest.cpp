@@ -6,6 +6,7 @@
 #include "platform/linux/x11/X11Screen.h"
 #include "platform/simulated/SimulatedDevice.h"
 #include "session/KVRecordingSession.h"
+#include "support/Eventually.h"
 #include "support/media/TemporaryFolder.h"
 #include "support/x11/XvfbServer.h"
 
@@ -50,8 +51,9 @@ class RecordedScreen : public testing::Test {
         awaitFirstFrame();
     }
     void awaitFirstFrame() {
-        while (session_->sessionWasResumed() || session_->firstSampleTimestamp().isZero())
-            std::this_thread::sleep_for(1ms);
+        EXPECT_TRUE(eventually([this] {
+            return !session_->sessionWasResumed() && !session_->firstSampleTimestamp().isZero();
+        }));
         std::this_thread::sleep_for(50ms);
     }
     /// Lets the counter run and notes by how much the recording has moved its times.
