@@ -2,6 +2,7 @@
 
 #include <cerrno>
 #include <fcntl.h>
+#include <string>
 #include <sys/mman.h>
 #include <sys/stat.h>
 
@@ -66,6 +67,16 @@ Result<VideoSurfaceRef> VideoSurface::map(UniqueFd descriptor, const Geometry& g
     // The constructor is private, so that a surface is always shared.
     return VideoSurfaceRef(
         new VideoSurface(std::move(descriptor), geometry, static_cast<std::byte*>(address), isWritable));
+}
+
+OptionalError VideoSurface::seal() {
+    if (::fcntl(descriptor_.get(), F_ADD_SEALS, F_SEAL_FUTURE_WRITE | F_SEAL_SEAL) != 0)
+        return systemError("surface seals");
+    const std::string path = "/proc/self/fd/" + std::to_string(descriptor_.get());
+    UniqueFd readOnly(::open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    if (!readOnly) return systemError("read-only surface descriptor");
+    descriptor_ = std::move(readOnly);
+    return std::nullopt;
 }
 
 std::span<std::byte> VideoSurface::writablePixels() const {

@@ -59,6 +59,10 @@ class VideoSurface : public ObjectHandle {
     /// The memory file; stays owned by the surface.
     int descriptor() const { return descriptor_.get(); }
 
+    /// From now on only the writable mappings that exist (this surface's own, a display server's) can change
+    /// the pixels: whoever receives the descriptor can only read. Once, before the surface is shared.
+    OptionalError seal();
+
   private:
     VideoSurface(UniqueFd descriptor, const Geometry& geometry, std::byte* pixels, bool isWritable);
     static Result<std::shared_ptr<VideoSurface>> map(UniqueFd descriptor, const Geometry& geometry,

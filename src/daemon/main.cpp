@@ -18,6 +18,8 @@
 #include "platform/linux/system/SystemClock.h"
 #include "platform/linux/system/TerminationSignals.h"
 #include "platform/linux/text/UnicodeTextFolding.h"
+#include "platform/linux/x11/X11RenderServer.h"
+#include "platform/linux/x11/X11Screen.h"
 #include "session/KVRecordingSession.h"
 #include "support/KVTemporaryFileStore.h"
 
@@ -50,6 +52,11 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     platform.calls = std::make_shared<SilentCallObserver>();
     platform.restrictions = std::make_shared<UnrestrictedProfile>();
     platform.displayLayout = std::make_shared<UnchangingDisplayLayout>();
+    const auto screen = std::make_shared<x11::X11Screen>("");
+    platform.screenCapture = screen;
+    platform.displayMirroring = screen;
+    platform.renderServer = std::make_shared<x11::X11RenderServer>("");
+    platform.analytics = std::make_shared<UngatheredAnalytics>();
     platform.bulletins = std::make_shared<InvisibleBulletins>();
     platform.alerts = std::make_shared<ShelllessAlerts>();
     platform.ipc = std::make_shared<UnreachableTransport>();
@@ -96,10 +103,7 @@ int run(const Options& options) {
         isTerminated = true;
         mainQueue->stop();
     });
-    const auto createSession = [](const std::string& bundleID) {
-        return std::make_shared<KVRecordingSession>(bundleID);
-    };
-    const int status = runDaemon(platform, createSession, reportReadiness);
+    const int status = runDaemon(platform, recordingSessionFactory(platform), reportReadiness);
     return isTerminated ? 0 : status;
 }
 

@@ -4,6 +4,7 @@
 #include "base/Guarded.h"
 #include "base/SerialQueue.h"
 #include "ipc/KVBroadcastConfiguration.h"
+#include "media/MovieWriter.h"
 #include "platform/DeviceProperties.h"
 #include "platform/MediaService.h"
 #include "platform/Preferences.h"
@@ -33,7 +34,7 @@ namespace kelvo {
 /// Thread-safe; the work runs on `movieWriterQueue` but for what is said at each operation. No lock is held
 /// while anything is called. No error is returned: a failure shows up as a finish handler without a URL, a
 /// trim handler that is never called, or only in the log.
-class KVMovieWriter : public std::enable_shared_from_this<KVMovieWriter> {
+class KVMovieWriter : public MovieWriter, public std::enable_shared_from_this<KVMovieWriter> {
   public:
     /// What a movie writer needs of the world.
     struct Services {
@@ -43,42 +44,40 @@ class KVMovieWriter : public std::enable_shared_from_this<KVMovieWriter> {
         std::shared_ptr<DeviceProperties> device;
     };
 
-    using StartHandler = std::function<void()>;
-    using URLHandler = std::function<void(const std::optional<URL>& movieURL)>;
-
     /// `windowSize` is the size of the recorded display in pixels. Caller's thread.
     static std::shared_ptr<KVMovieWriter> create(const Size& windowSize, std::string outputPath,
                                                  Services services);
 
     /// Removes what stands at the output path and makes the file's writer. Returns at once; `handler`, which
     /// may be none, runs on the store's background queue, whether that succeeded or not.
-    void startWritingHandler(StartHandler handler);
+    void startWritingHandler(StartHandler handler) override;
 
     /// Makes a new file writer and its inputs, with empty buffer queues. Synchronous on `movieWriterQueue`.
     void setupAssetWriter();
 
     /// Synchronous on `movieWriterQueue`. Always true, whatever becomes of the sample.
-    bool appendVideoSampleBuffer(const SampleBufferRef& sample, const AffineTransform& windowTransform);
+    bool appendVideoSampleBuffer(const SampleBufferRef& sample,
+                                 const AffineTransform& windowTransform) override;
 
     /// Synchronous on `movieWriterQueue`. Dropped unless a video sample has started the movie.
-    void appendAudio1SampleBuffer(const SampleBufferRef& sample);
-    void appendAudio2SampleBuffer(const SampleBufferRef& sample);
+    void appendAudio1SampleBuffer(const SampleBufferRef& sample) override;
+    void appendAudio2SampleBuffer(const SampleBufferRef& sample) override;
 
     /// Completes the movie. Returns at once; `handler`, which may be none, gets the movie's URL, or none when
     /// there is no movie, on `movieWriterQueue` or on a queue of the file writer's. Only the first call
     /// counts: a later one's handler is never called.
-    void finishWritingWithHandler(URLHandler handler);
+    void finishWritingWithHandler(URLHandler handler) override;
 
     /// Exports the movie at `url` without the first `startClipDuration` and the last `endClipDuration`
     /// seconds (rounded to whole seconds), without encoding it again. Returns at once; `handler` gets the
     /// trimmed movie's URL on the export's queue, and is not called when the export fails.
     void trimMovieWithURL(const URL& url, double startClipDuration, double endClipDuration,
-                          const URL& outputFileURL, URLHandler handler);
+                          const URL& outputFileURL, URLHandler handler) override;
 
     /// The movie is to end at the last video frame appended so far. Caller's thread.
-    void notifyRecordingMayBeStopped();
+    void notifyRecordingMayBeStopped() override;
     /// Takes that back. Caller's thread.
-    void notifyRecordingResumed();
+    void notifyRecordingResumed() override;
 
     /// Begins the movie with this sample. False when the file cannot be written. On the queue of its caller;
     /// public only because a failed writer's restart calls it off `movieWriterQueue`.
@@ -97,7 +96,7 @@ class KVMovieWriter : public std::enable_shared_from_this<KVMovieWriter> {
     MediaTime lastAudio2PresentationTime() const { return audio2_.lastPresentationTime.copy(); }
     MediaTime trimVideoPresentationTime() const { return trimVideoPresentationTime_.copy(); }
     const std::string& outputPath() const { return outputPath_; }
-    URL outputURL() const { return URL::file(outputPath_); }
+    URL outputURL() const override { return URL::file(outputPath_); }
     const Size& windowSize() const { return windowSize_; }
     bool didProcessFirstSample() const { return didProcessFirstSample_; }
     bool isFinishingWriting() const { return isFinishingWriting_; }
@@ -105,11 +104,11 @@ class KVMovieWriter : public std::enable_shared_from_this<KVMovieWriter> {
     std::shared_ptr<const KVBroadcastConfiguration> broadcastConfig() const {
         return broadcastConfig_.copy();
     }
-    void setBroadcastConfig(std::shared_ptr<const KVBroadcastConfiguration> configuration) {
+    void setBroadcastConfig(std::shared_ptr<const KVBroadcastConfiguration> configuration) override {
         broadcastConfig_.set(std::move(configuration));
     }
     bool systemRecording() const { return systemRecording_; }
-    void setSystemRecording(bool isSystemRecording) { systemRecording_ = isSystemRecording; }
+    void setSystemRecording(bool isSystemRecording) override { systemRecording_ = isSystemRecording; }
 
   private:
     /// One track of the movie: its input, what waits for it, and the last sample that it got.

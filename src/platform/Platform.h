@@ -2,6 +2,7 @@
 
 #include "base/Clock.h"
 #include "base/MainQueue.h"
+#include "platform/AnalyticsSink.h"
 #include "platform/BulletinService.h"
 #include "platform/Bundles.h"
 #include "platform/CallObserver.h"
@@ -13,7 +14,9 @@
 #include "platform/NotificationCenter.h"
 #include "platform/Preferences.h"
 #include "platform/Random.h"
+#include "platform/RenderServer.h"
 #include "platform/RestrictionsProfile.h"
+#include "platform/ScreenCapture.h"
 #include "platform/StoragePurgeService.h"
 #include "platform/SystemAlert.h"
 #include "platform/TextFolding.h"
@@ -40,6 +43,10 @@ struct Platform {
     std::shared_ptr<CallObserver> calls;
     std::shared_ptr<RestrictionsProfile> restrictions;
     std::shared_ptr<DisplayLayoutService> displayLayout;
+    std::shared_ptr<ScreenCaptureService> screenCapture;
+    std::shared_ptr<DisplayMirroring> displayMirroring;
+    std::shared_ptr<RenderServer> renderServer;
+    std::shared_ptr<AnalyticsSink> analytics;
     std::shared_ptr<BulletinService> bulletins;
     std::shared_ptr<SystemAlertService> alerts;
     std::shared_ptr<IPCTransport> ipc;

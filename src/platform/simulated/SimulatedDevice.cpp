@@ -20,6 +20,9 @@ SimulatedDevice::SimulatedDevice()
       calls(std::make_shared<SimulatedCallObserver>(mainQueue)),
       restrictions(std::make_shared<SimulatedRestrictions>()),
       displayLayout(std::make_shared<SimulatedDisplayLayout>()),
+      screen(std::make_shared<SimulatedScreen>(clock)),
+      renderServer(std::make_shared<SimulatedRenderServer>()),
+      analytics(std::make_shared<SimulatedAnalytics>(faults)),
       bulletins(std::make_shared<SimulatedBulletins>()),
       alerts(std::make_shared<SimulatedAlerts>(faults)),
       ipc(std::make_shared<SimulatedIPC>()),
@@ -41,6 +44,10 @@ Platform SimulatedDevice::platform() const {
     platform.calls = calls;
     platform.restrictions = restrictions;
     platform.displayLayout = displayLayout;
+    platform.screenCapture = screen;
+    platform.displayMirroring = screen;
+    platform.renderServer = renderServer;
+    platform.analytics = analytics;
     platform.bulletins = bulletins;
     platform.alerts = alerts;
     platform.ipc = ipc;
@@ -56,6 +63,7 @@ void SimulatedDevice::settle() {
 
 void SimulatedDevice::advance(std::chrono::nanoseconds interval) {
     clock->advance(interval);
+    screen->catchUp();
     settle();
 }
 

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/Platform.h"
+#include "platform/simulated/SimulatedAnalytics.h"
 #include "platform/simulated/SimulatedBundles.h"
 #include "platform/simulated/SimulatedClock.h"
 #include "platform/simulated/SimulatedEnvironment.h"
@@ -9,6 +10,7 @@
 #include "platform/simulated/SimulatedIPC.h"
 #include "platform/simulated/SimulatedMedia.h"
 #include "platform/simulated/SimulatedNotifications.h"
+#include "platform/simulated/SimulatedScreen.h"
 #include "platform/simulated/SimulatedSettings.h"
 #include "platform/simulated/SimulatedShell.h"
 #include "platform/simulated/SimulatedStoragePurge.h"
@@ -43,7 +45,7 @@ class SimulatedDevice {
 
     /// Runs main-queue tasks, due timers and global-queue work until none is left.
     void settle();
-    /// Moves the clock and settles.
+    /// Moves the clock, lets the screen deliver what that made due, and settles.
     void advance(std::chrono::nanoseconds interval);
 
     /// The screen goes blank or comes back.
@@ -89,6 +91,9 @@ class SimulatedDevice {
     const std::shared_ptr<SimulatedCallObserver> calls;
     const std::shared_ptr<SimulatedRestrictions> restrictions;
     const std::shared_ptr<SimulatedDisplayLayout> displayLayout;
+    const std::shared_ptr<SimulatedScreen> screen;
+    const std::shared_ptr<SimulatedRenderServer> renderServer;
+    const std::shared_ptr<SimulatedAnalytics> analytics;
     const std::shared_ptr<SimulatedBulletins> bulletins;
     const std::shared_ptr<SimulatedAlerts> alerts;
     const std::shared_ptr<SimulatedIPC> ipc;

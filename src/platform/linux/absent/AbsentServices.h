@@ -1,5 +1,6 @@
 #pragma once
 
+#include "platform/AnalyticsSink.h"
 #include "platform/BulletinService.h"
 #include "platform/CallObserver.h"
 #include "platform/DisplayLayout.h"
@@ -13,6 +14,12 @@
 /// Services that this Linux device does not have (yet): each answers as a device would on which the thing in
 /// question never happens. All are thread-safe, having no state.
 namespace kelvo {
+
+/// A device whose usage nobody gathers.
+class UngatheredAnalytics : public AnalyticsSink {
+  public:
+    OptionalError send(const AnalyticsMessage&) override { return std::nullopt; }
+};
 
 /// A device that nobody calls.
 class SilentCallObserver : public CallObserver {

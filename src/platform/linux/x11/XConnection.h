@@ -1,0 +1,68 @@
+#pragma once
+
+#include <chrono>
+#include <cstdlib>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <xcb/xcb.h>
+
+namespace kelvo::x11 {
+
+struct XFree {
+    void operator()(void* memory) const { std::free(memory); }
+};
+
+/// What libxcb handed out to be freed.
+template <typename Content>
+using XOwned = std::unique_ptr<Content, XFree>;
+
+/// A client's connection to an X server. One thread at a time; nothing of the server's outlives it.
+///
+/// Waiting for a reply never outlasts the server: it ends, without a reply, when the connection breaks, when
+/// the interrupt descriptor becomes readable and when the time limit passes.
+class XConnection {
+  public:
+    using TimeLimit = std::optional<std::chrono::milliseconds>;
+
+    /// Connects to `display` (":0"; empty takes $DISPLAY). `interruptFd` is -1 or outlives the connection.
+    /// None when the display cannot be reached.
+    static std::unique_ptr<XConnection> open(const std::string& display, int interruptFd = -1,
+                                             TimeLimit replyLimit = std::nullopt);
+
+    ~XConnection();
+    XConnection(const XConnection&) = delete;
+    XConnection& operator=(const XConnection&) = delete;
+
+    xcb_connection_t* raw() const { return connection_; }
+    const xcb_screen_t& screen() const { return *screen_; }
+    xcb_window_t root() const { return screen_->root; }
+
+    bool isBroken() const { return xcb_connection_has_error(connection_) != 0; }
+
+    /// Whether the server stores a pixel of a 24-bit deep picture as blue, green, red and a spare byte.
+    bool drawsBGRx() const;
+    bool hasExtension(xcb_extension_t& extension) const;
+
+    /// The reply to a request; none when the request failed or waiting ended.
+    template <typename Reply, typename Cookie>
+    XOwned<Reply> await(Cookie cookie) {
+        return XOwned<Reply>(static_cast<Reply*>(awaitReply(cookie.sequence)));
+    }
+
+    xcb_atom_t atom(std::string_view name);
+
+  private:
+    XConnection(xcb_connection_t* connection, const xcb_screen_t* screen, int interruptFd,
+                TimeLimit replyLimit);
+    void* awaitReply(unsigned sequence);
+    bool waitForInput() const;
+
+    xcb_connection_t* const connection_;
+    const xcb_screen_t* const screen_;
+    const int interruptFd_;
+    const TimeLimit replyLimit_;
+};
+
+}  // namespace kelvo::x11
