@@ -4,7 +4,8 @@ set(CMAKE_CXX_STANDARD 20)
 set(CMAKE_CXX_STANDARD_REQUIRED ON)
 set(CMAKE_CXX_EXTENSIONS OFF)
 set(CMAKE_RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR})
-set(CMAKE_CXX_FLAGS_DEV "-O1 -g1")  # the everyday build type: quick to build, fit to debug
+set(CMAKE_CXX_FLAGS_DEV "-O1 -g1")    # the everyday build type: quick to build, fit to debug
+set(CMAKE_CXX_FLAGS_DEBUG "-O0 -g1")  # for the address sanitizer, whose checks take the optimiser long to see through
 set(CMAKE_POSITION_INDEPENDENT_CODE ON)
 find_package(Threads REQUIRED)
 
@@ -18,7 +19,7 @@ target_compile_definitions(kelvo_settings INTERFACE KELVO_VERSION="${PROJECT_VER
 target_link_libraries(kelvo_settings INTERFACE Threads::Threads)
 
 if(KELVO_SANITIZE)
-    # GCC warns that TSan does not model fences; we use none of our own.
+    # GCC warns that TSan does not model fences, of which we use none of our own.
     target_compile_options(kelvo_settings INTERFACE -fsanitize=${KELVO_SANITIZE} -fno-omit-frame-pointer
         -fno-sanitize-recover=all $<$<CXX_COMPILER_ID:GNU>:-Wno-tsan>)
     target_link_options(kelvo_settings INTERFACE -fsanitize=${KELVO_SANITIZE})
@@ -43,4 +44,11 @@ function(kelvo_test name)
     target_include_directories(${name} PRIVATE ${CMAKE_SOURCE_DIR}/tests)
     target_link_libraries(${name} PRIVATE kelvo_settings ${ARG_DEPENDS} kelvo_test_support)
     gtest_discover_tests(${name} DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 120)
+endfunction()
+
+# kelvo_loads_modules(TARGET): the program TARGET may load our modules, which use its base library: all of it is
+# linked in and exported.
+function(kelvo_loads_modules target)
+    set_target_properties(${target} PROPERTIES ENABLE_EXPORTS ON
+        LINK_LIBRARY_OVERRIDE "WHOLE_ARCHIVE,kelvo_base")
 endfunction()

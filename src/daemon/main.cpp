@@ -7,6 +7,7 @@
 #include "platform/linux/log/JournalLog.h"
 #include "platform/linux/log/Readiness.h"
 #include "platform/linux/log/StderrLog.h"
+#include "platform/linux/media_loader/LoadedMediaService.h"
 #include "platform/linux/notifications/LinuxNotificationCenter.h"
 #include "platform/linux/settings/DeviceFile.h"
 #include "platform/linux/settings/JsonPreferences.h"
@@ -59,6 +60,8 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     platform.bulletins = std::make_shared<InvisibleBulletins>();
     platform.alerts = std::make_shared<ShelllessAlerts>();
     platform.ipc = std::make_shared<UnreachableTransport>();
+    platform.media =
+        std::make_shared<LoadedMediaService>(platform.fileSystem, LoadedMediaService::usualFolders());
     return platform;
 }
 

@@ -42,7 +42,7 @@ class LinuxWorld {
         if (recipe.displayName) info << R"(, "displayName": ")" << *recipe.displayName << '"';
         info << "}";
         for (const auto& [localization, texts] : recipe.texts)
-            writeTable(folder + "/" + localization + ".lproj", texts);
+            writeTable(fs::path(folder) / (localization + ".lproj"), texts);
     }
     void addFile(const std::string& path) {
         fs::create_directories(fs::path(deviceRoot_->hostPath(path)).parent_path());
@@ -53,9 +53,9 @@ class LinuxWorld {
     std::int32_t missingProcess() { return std::numeric_limits<std::int32_t>::max(); }
 
   private:
-    static void writeTable(const std::string& folder, const std::map<std::string, std::string>& texts) {
+    static void writeTable(const fs::path& folder, const std::map<std::string, std::string>& texts) {
         fs::create_directories(folder);
-        std::ofstream table(folder + "/Localizable.strings");
+        std::ofstream table(folder / "Localizable.strings");
         for (const auto& [key, text] : texts)
             table << '"' << key << "\" = \"" << escaped(text) << "\";\n";
     }

@@ -1,9 +1,10 @@
 #pragma once
 
 #include "base/Guarded.h"
-#include "platform/NotificationCenter.h"
+#include "platform/NotificationRegistry.h"
 
 #include <map>
+#include <string>
 
 namespace kelvo {
 
@@ -11,30 +12,30 @@ namespace kelvo {
 class SimulatedNotifications : public NotificationCenter {
   public:
     NotificationToken registerForNotification(std::string_view name, QueuePriority priority,
-                                              Handler handler) override;
-    std::uint64_t state(NotificationToken token) override;
-    void removeObservers(std::string_view name) override;
+                                              Handler handler) override {
+        return registry_.add(name, priority, std::move(handler));
+    }
+    std::uint64_t state(NotificationToken token) override { return registry_.state(token); }
+    void removeObservers(std::string_view name) override {
+        registry_.remove(name);
+        removals_.with([&](auto& removals) { ++removals[std::string(name)]; });
+    }
 
     /// Sets the state of `name` and tells everybody who registered for it.
-    void post(std::string_view name, std::uint64_t state);
+    void post(std::string_view name, std::uint64_t state) { registry_.post(name, state); }
 
-    std::size_t observerCount(std::string_view name) const;
+    std::size_t observerCount(std::string_view name) const { return registry_.count(name); }
     /// How often `removeObservers` was called for `name`.
-    int removalCount(std::string_view name) const;
+    int removalCount(std::string_view name) const {
+        return removals_.with([&](const auto& removals) {
+            const auto entry = removals.find(std::string(name));
+            return entry == removals.end() ? 0 : entry->second;
+        });
+    }
 
   private:
-    struct Registration {
-        std::string name;
-        QueuePriority priority;
-        Handler handler;
-    };
-    struct Center {
-        std::map<NotificationToken, Registration> registrations;
-        std::map<std::string, std::uint64_t, std::less<>> states;
-        std::map<std::string, int, std::less<>> removals;
-        NotificationToken lastToken = 0;
-    };
-    Guarded<Center> center_;
+    NotificationRegistry registry_;
+    Guarded<std::map<std::string, int>> removals_;
 };
 
 }  // namespace kelvo

@@ -42,6 +42,7 @@ TEST(GuardedTest, ReplacedValueIsDestroyedOutsideTheLock) {
 TEST(GuardedTest, AccessesFromManyThreadsDoNotMeet) {
     Guarded<int> guarded;
     std::vector<std::thread> threads;
+    threads.reserve(4);
     for (int thread = 0; thread < 4; ++thread) {
         threads.emplace_back([&] {
             for (int i = 0; i < 1000; ++i)

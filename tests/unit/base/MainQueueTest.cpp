@@ -175,10 +175,10 @@ TEST_F(MainQueueTest, SyncCallerWhoseTaskStopsTheLoopStillWaitsForItsEnd) {
 
 TEST_F(MainQueueTest, DroppedTasksMayQueueAnotherAsTheyGo) {
     queue_.async([this] { queue_.stop(); });
-    queue_.async([this, token = std::shared_ptr<void>(nullptr, [this](void*) {
-                            queue_.async([] {});  // dropped in its turn, and no lock is held here
-                            ++runs_;
-                        })] {});
+    queue_.async([token = std::shared_ptr<void>(nullptr, [this](void*) {
+                      queue_.async([] {});  // dropped in its turn, and no lock is held here
+                      ++runs_;
+                  })] {});
     queue_.run();
     EXPECT_EQ(runs_, 1);
 }

@@ -114,6 +114,7 @@ TEST(SerialQueueTest, EachCallersTasksKeepTheirOrderUnderContention) {
     SerialQueue queue("test.contention");
     std::array<Order, kCallers> orders;  // touched by tasks of the queue only, which never run side by side
     std::vector<std::thread> callers;
+    callers.reserve(orders.size());
     for (Order& order : orders) {
         callers.emplace_back([&queue, &order] {
             for (int i = 0; i < kTasks; ++i) {

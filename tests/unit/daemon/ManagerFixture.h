@@ -19,9 +19,18 @@ class ManagerFixture : public testing::Test {
     static constexpr const char* kStore = "/private/var/mobile/Library/KelvoKit/";
     static constexpr const char* kPurgeService = "com.quillon.kelvod-cache-delete";
 
+    /// What a session was never asked to complete may hold the session itself.
+    ~ManagerFixture() override {
+        for (const auto& made : sessions_) {
+            made->finish = nullptr;
+            made->cleanup = nullptr;
+        }
+    }
+
     void createManager() {
-        manager = KVRecordingManager::create(device.platform(), [](const std::string& bundleID) {
-            return std::make_shared<FakeRecordingSession>(bundleID);
+        manager = KVRecordingManager::create(device.platform(), [this](const std::string& bundleID) {
+            sessions_.push_back(std::make_shared<FakeRecordingSession>(bundleID));
+            return sessions_.back();
         });
     }
 
@@ -51,6 +60,9 @@ class ManagerFixture : public testing::Test {
     const LogRecorder log;
     SimulatedDevice device;
     std::shared_ptr<KVRecordingManager> manager;
+
+  private:
+    std::vector<std::shared_ptr<FakeRecordingSession>> sessions_;
 };
 
 }  // namespace kelvo::test

@@ -145,6 +145,7 @@ TEST(KVSessionManagerThreadsTest, ThreadsThatAskAtOnceGetOneSession) {
         nullptr);
     std::vector<SessionRef> seen(8);
     std::vector<std::thread> threads;
+    threads.reserve(seen.size());
     for (SessionRef& place : seen) {
         threads.emplace_back(
             [&] { place = manager.recordingSessionInstanceWithBundleIdentifier("com.example.a"); });

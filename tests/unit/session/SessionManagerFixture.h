@@ -77,14 +77,14 @@ class SessionManagerFixture : public testing::Test {
 
     /// The session of a client that records.
     FakeSessionRef recording(const std::string& bundleID) {
-        const auto session = std::static_pointer_cast<FakeRecordingSession>(
+        auto session = std::static_pointer_cast<FakeRecordingSession>(
             manager.recordingSessionInstanceWithBundleIdentifier(bundleID));
         session->recording = true;
         session->systemRecording = session->bundleID() == kShell;
         return session;
     }
     FakeSessionRef idle(const std::string& bundleID) {
-        const auto session = recording(bundleID);
+        auto session = recording(bundleID);
         session->recording = false;
         return session;
     }

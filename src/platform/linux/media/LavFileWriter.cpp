@@ -34,7 +34,7 @@ OptionalError LavFileWriter::openMovie() {
         if (!format) return format.error();
         tracks.push_back(std::move(*format));
     }
-    auto file = MovieFile::create(path_, tracks);
+    auto file = MovieFile::create(path_, tracks, MovieFile::Durability::synced);
     if (!file) return file.error();
     session_->muxer = std::make_unique<MovieMuxer>(
         std::move(*file), tracks, [session = session_.get()](const KVError& error) { session->fail(error); });

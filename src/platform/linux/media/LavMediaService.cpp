@@ -1,42 +1,18 @@
 #include "platform/linux/media/LavMediaService.h"
 
-#include "base/Guarded.h"
 #include "base/KVLog.h"
 #include "platform/linux/media/LavExportSession.h"
 #include "platform/linux/media/LavFileWriter.h"
 #include "platform/linux/media/LavWriterInput.h"
 #include "platform/linux/media/MovieReader.h"
+#include "platform/linux/media/SampleQueue.h"
 
 #include <cerrno>
-#include <deque>
 #include <filesystem>
 #include <sys/stat.h>
 
 namespace kelvo {
 namespace {
-
-class SampleQueue : public BufferQueue {
-  public:
-    int enqueue(SampleBufferRef sample) override {
-        samples_.with([&](auto& samples) { samples.push_back(std::move(sample)); });
-        return 0;
-    }
-    SampleBufferRef dequeue() override {
-        return samples_.with([](auto& samples) -> SampleBufferRef {
-            if (samples.empty()) return nullptr;
-            SampleBufferRef oldest = std::move(samples.front());
-            samples.pop_front();
-            return oldest;
-        });
-    }
-    bool isEmpty() const override {
-        return samples_.with([](const auto& samples) { return samples.empty(); });
-    }
-    void reset() override { samples_.set({}); }
-
-  private:
-    Guarded<std::deque<SampleBufferRef>> samples_;
-};
 
 /// Whether a file can be made in the folder of `path`.
 OptionalError checkFolder(const std::string& path) {

@@ -159,7 +159,7 @@ OptionalError Mix::openAudio() {
 }
 
 OptionalError Mix::openFile() {
-    auto file = MovieFile::create(request_.outputPath, formats_);
+    auto file = MovieFile::create(request_.outputPath, formats_, MovieFile::Durability::cached);
     if (!file) return file.error();
     muxer_ = std::make_unique<MovieMuxer>(std::move(*file), formats_,
                                           [this](const KVError& error) { muxerError_.set(error); });

@@ -29,15 +29,18 @@ std::int64_t nowInSeconds() {
 
 }  // namespace
 
-MovieFile::MovieFile(UniqueFd file, std::vector<TrackFormat> tracks, std::int64_t creationTime)
-    : file_(std::move(file)), tracks_(std::move(tracks)), creationTime_(creationTime) {}
+MovieFile::MovieFile(UniqueFd file, std::vector<TrackFormat> tracks, Durability durability)
+    : file_(std::move(file)),
+      tracks_(std::move(tracks)),
+      durability_(durability),
+      creationTime_(nowInSeconds()) {}
 
-Result<std::unique_ptr<MovieFile>> MovieFile::create(const std::string& path,
-                                                     std::vector<TrackFormat> tracks) {
+Result<std::unique_ptr<MovieFile>> MovieFile::create(const std::string& path, std::vector<TrackFormat> tracks,
+                                                     Durability durability) {
     UniqueFd file(::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644));
     if (!file) return KVError::posix(errno, path);
     // The constructor is private, so that no movie file is without its header.
-    std::unique_ptr<MovieFile> movie(new MovieFile(std::move(file), std::move(tracks), nowInSeconds()));
+    std::unique_ptr<MovieFile> movie(new MovieFile(std::move(file), std::move(tracks), durability));
     if (const OptionalError error = movie->writeHeader()) {
         ::unlink(path.c_str());
         return *error;
@@ -71,9 +74,11 @@ OptionalError MovieFile::commit(std::span<const std::byte> head, Pieces rest) {
         static_cast<void>(::ftruncate(file_.get(), static_cast<off_t>(end_)));
         return error;
     }
-    // Starts the disk's work now, so that little is left to wait for when the movie is finished.
-    static_cast<void>(::sync_file_range(file_.get(), static_cast<off_t>(end_), static_cast<off_t>(size),
-                                        SYNC_FILE_RANGE_WRITE));
+    if (durability_ == Durability::synced) {
+        // Starts the disk's work now, so that little is left to wait for when the movie is finished.
+        static_cast<void>(::sync_file_range(file_.get(), static_cast<off_t>(end_), static_cast<off_t>(size),
+                                            SYNC_FILE_RANGE_WRITE));
+    }
     end_ += size;
     return std::nullopt;
 }
@@ -91,7 +96,7 @@ OptionalError MovieFile::appendFragment(std::span<const SampleRun> runs) {
 
 OptionalError MovieFile::finish(const MediaTime& end) {
     OptionalError error = appendIndex(end);
-    if (!error && ::fdatasync(file_.get()) != 0) error = KVError::posix(errno, "movie file");
+    if (!error) error = sync();
     if (error) {
         static_cast<void>(::ftruncate(file_.get(), static_cast<off_t>(end_)));
         return error;
@@ -119,7 +124,12 @@ OptionalError MovieFile::turnIntoIndexedMovie() {
     head.type("mdat");
     head.u64(end_ + kHeadSize - kHeaderOffset);
     if (OptionalError error = writeAt(file_.get(), kHeaderOffset, head.bytes())) return error;
-    return ::fdatasync(file_.get()) == 0 ? std::nullopt : OptionalError(KVError::posix(errno, "movie file"));
+    return sync();
+}
+
+OptionalError MovieFile::sync() const {
+    if (durability_ == Durability::cached || ::fdatasync(file_.get()) == 0) return std::nullopt;
+    return KVError::posix(errno, "movie file");
 }
 
 }  // namespace kelvo

@@ -20,9 +20,13 @@ namespace kelvo {
 /// Caller's thread.
 class MovieFile {
   public:
+    /// Whether what is written must outlast a failure of the power too, as far as the disk allows: a
+    /// recording cannot be had again, an export can.
+    enum class Durability { synced, cached };
+
     /// Makes the file at `path`, where nothing stands yet, and writes its header.
-    static Result<std::unique_ptr<MovieFile>> create(const std::string& path,
-                                                     std::vector<TrackFormat> tracks);
+    static Result<std::unique_ptr<MovieFile>> create(const std::string& path, std::vector<TrackFormat> tracks,
+                                                     Durability durability);
 
     /// Adds one fragment: a run for each track, some of them empty. On failure the file ends with the
     /// fragment before, as far as that can be had.
@@ -33,16 +37,18 @@ class MovieFile {
     OptionalError finish(const MediaTime& end);
 
   private:
-    MovieFile(UniqueFd file, std::vector<TrackFormat> tracks, std::int64_t creationTime);
+    MovieFile(UniqueFd file, std::vector<TrackFormat> tracks, Durability durability);
 
     OptionalError writeHeader();
+    OptionalError sync() const;
     OptionalError commit(std::span<const std::byte> head, Pieces rest);
     OptionalError appendIndex(const MediaTime& end);
     OptionalError turnIntoIndexedMovie();
 
     const UniqueFd file_;
     const std::vector<TrackFormat> tracks_;
-    const std::int64_t creationTime_;
+    const Durability durability_;
+    const std::int64_t creationTime_;  ///< seconds since 1970
     std::uint64_t headerEnd_ = 0;
     std::uint64_t end_ = 0;  ///< of what is complete
     std::uint32_t sequenceNumber_ = 0;

@@ -57,6 +57,11 @@ bool MovieMuxer::belongsToNextFragment(std::size_t track, const SampleTiming& ti
 
 void MovieMuxer::closeFragment() {
     Fragment next(gathering_.size());
+    // The next one will be about as large: growing step by step would copy it over and over.
+    for (std::size_t i = 0; i < next.size(); ++i) {
+        next[i].samples.reserve(gathering_[i].samples.size());
+        next[i].data.reserve(gathering_[i].data.size());
+    }
     closed_.push_back(std::exchange(gathering_, std::move(next)));
     wakes_.notify_one();
 }

@@ -127,7 +127,7 @@ OptionalError PassThrough::beginFile() {
     for (const auto& track : tracks_) {
         if (track) formats.push_back(track->format);
     }
-    auto file = MovieFile::create(request_.outputPath, formats);
+    auto file = MovieFile::create(request_.outputPath, formats, MovieFile::Durability::cached);
     if (!file) return file.error();
     muxer_ = std::make_unique<MovieMuxer>(std::move(*file), formats,
                                           [this](const KVError& error) { muxerError_.set(error); });

@@ -23,45 +23,25 @@ LinuxNotificationCenter::LinuxNotificationCenter(std::shared_ptr<const DeviceRoo
 
 LinuxNotificationCenter::~LinuxNotificationCenter() {
     ::eventfd_write(stopEvent_.get(), 1);
-    std::thread watcher;
-    registry_.with([&](Registry& registry) { watcher = std::move(registry.watcher); });
+    std::thread watcher = watcher_.exchange({});
     if (watcher.joinable()) watcher.join();
 }
 
 NotificationToken LinuxNotificationCenter::registerForNotification(std::string_view name,
                                                                    QueuePriority priority, Handler handler) {
-    return registry_.with([&](Registry& registry) {
-        registry.registrations[++registry.lastToken] = {std::string(name), priority, std::move(handler)};
-        if (!registry.watcher.joinable()) registry.watcher = std::thread([this] { watch(); });
-        return registry.lastToken;
+    const NotificationToken token = registry_.add(name, priority, std::move(handler));
+    watcher_.with([this](std::thread& watcher) {
+        if (!watcher.joinable()) watcher = std::thread([this] { watch(); });
     });
+    return token;
 }
 
 std::uint64_t LinuxNotificationCenter::state(NotificationToken token) {
-    return registry_.with([&](Registry& registry) -> std::uint64_t {
-        const auto registration = registry.registrations.find(token);
-        if (registration == registry.registrations.end()) return 0;
-        const auto state = registry.states.find(registration->second.name);
-        return state == registry.states.end() ? 0 : state->second;
-    });
+    return registry_.state(token);
 }
 
 void LinuxNotificationCenter::removeObservers(std::string_view name) {
-    registry_.with([&](Registry& registry) {
-        std::erase_if(registry.registrations, [&](const auto& entry) { return entry.second.name == name; });
-    });
-}
-
-void LinuxNotificationCenter::post(const std::string& name, std::uint64_t state) {
-    registry_.with([&](Registry& registry) {
-        registry.states[name] = state;
-        for (const auto& [token, registration] : registry.registrations) {
-            if (registration.name != name) continue;
-            GlobalQueue::get(registration.priority).async([handler = registration.handler, token = token] {
-                handler(token);
-            });
-        }
-    });
+    registry_.remove(name);
 }
 
 void LinuxNotificationCenter::watch() {
@@ -86,10 +66,10 @@ void LinuxNotificationCenter::watch() {
 
 /// A state that was set before anybody watched fires once, so that a screen that is blank already counts.
 void LinuxNotificationCenter::postInitialStates(const StateFiles& files, const LoginSession* session) {
-    if (session != nullptr && session->isLocked()) post(std::string(kBlankedScreenNotification), 1);
+    if (session != nullptr && session->isLocked()) registry_.post(kBlankedScreenNotification, 1);
     for (const std::string& name : files.names()) {
         if (session != nullptr && name == kBlankedScreenNotification) continue;
-        if (const std::uint64_t state = files.state(name); state != 0) post(name, state);
+        if (const std::uint64_t state = files.state(name); state != 0) registry_.post(name, state);
     }
 }
 
@@ -97,7 +77,7 @@ void LinuxNotificationCenter::handleLoginSession(std::unique_ptr<LoginSession>& 
     const bool wasLocked = session->isLocked();
     const bool isAlive = session->process();
     if (session->isLocked() != wasLocked) {
-        post(std::string(kBlankedScreenNotification), session->isLocked() ? 1 : 0);
+        registry_.post(kBlankedScreenNotification, session->isLocked() ? 1 : 0);
     }
     if (isAlive) return;
     KVLogError("lost the system bus; the screen's lock state is read from its state file now");
@@ -107,7 +87,7 @@ void LinuxNotificationCenter::handleLoginSession(std::unique_ptr<LoginSession>& 
 void LinuxNotificationCenter::handleStateFiles(StateFiles& files, bool hasLoginSession) {
     for (const std::string& name : files.takeChangedNames()) {
         if (hasLoginSession && name == kBlankedScreenNotification) continue;
-        post(name, files.state(name));
+        registry_.post(name, files.state(name));
     }
 }
 

@@ -2,12 +2,10 @@
 
 #include "base/Guarded.h"
 #include "base/UniqueFd.h"
-#include "platform/NotificationCenter.h"
+#include "platform/NotificationRegistry.h"
 #include "platform/linux/files/DeviceRoot.h"
 
-#include <map>
 #include <memory>
-#include <string>
 #include <thread>
 
 namespace kelvo {
@@ -32,27 +30,15 @@ class LinuxNotificationCenter : public NotificationCenter {
     void removeObservers(std::string_view name) override;
 
   private:
-    struct Registration {
-        std::string name;
-        QueuePriority priority;
-        Handler handler;
-    };
-    struct Registry {
-        std::map<NotificationToken, Registration> registrations;
-        std::map<std::string, std::uint64_t, std::less<>> states;
-        NotificationToken lastToken = 0;
-        std::thread watcher;
-    };
-
     void watch();
-    void post(const std::string& name, std::uint64_t state);
     void postInitialStates(const StateFiles& files, const LoginSession* session);
     void handleLoginSession(std::unique_ptr<LoginSession>& session);
     void handleStateFiles(StateFiles& files, bool hasLoginSession);
 
     const std::shared_ptr<const DeviceRoot> root_;
     UniqueFd stopEvent_;
-    Guarded<Registry> registry_;
+    NotificationRegistry registry_;
+    Guarded<std::thread> watcher_;
 };
 
 }  // namespace kelvo

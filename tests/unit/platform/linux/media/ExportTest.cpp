@@ -3,6 +3,7 @@
 
 #include <chrono>
 #include <cmath>
+#include <filesystem>
 #include <fstream>
 #include <future>
 #include <numeric>
@@ -42,7 +43,7 @@ class ExportTest : public MovieFixture {
         return run(lastSession);
     }
 
-    const std::string output = folder / "output.mp4";
+    const std::string output = inFolder("output.mp4");
     std::shared_ptr<ExportSession> lastSession;
 };
 
@@ -300,7 +301,7 @@ class BadMovieTest : public ExportTest, public ::testing::WithParamInterface<Bad
   protected:
     void SetUp() override {
         makeSource(2);
-        const std::string good = folder / "good.mp4";
+        const std::string good = inFolder("good.mp4");
         std::filesystem::rename(path, good);
         outputOf("GOOD='" + good + "' BAD='" + path + "'; " + GetParam().command);
     }

@@ -4,6 +4,7 @@
 
 #include <cmath>
 #include <cstdlib>
+#include <filesystem>
 #include <fstream>
 #include <limits>
 #include <random>
@@ -277,7 +278,7 @@ TEST_F(LavFileWriterTest, FileInTheWayFailsTheStartAndStays) {
 }
 
 TEST_F(LavFileWriterTest, MissingFolderFailsTheCreation) {
-    const auto writer = service.createFileWriter(URL::file(folder / "none/movie.mp4"), MediaFileType::mpeg4);
+    const auto writer = service.createFileWriter(URL::file(inFolder("none/movie.mp4")), MediaFileType::mpeg4);
     ASSERT_FALSE(writer);
     EXPECT_EQ(writer.error().code(), ENOENT);
 }

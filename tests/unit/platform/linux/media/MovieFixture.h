@@ -2,9 +2,9 @@
 
 #include "platform/linux/media/LavMediaService.h"
 #include "support/LogRecorder.h"
+#include "support/TemporaryDirectory.h"
 #include "support/media/HostFileSystem.h"
 #include "support/media/MovieProbe.h"
-#include "support/media/TemporaryFolder.h"
 #include "support/media/TestMovie.h"
 
 #include <gtest/gtest.h>
@@ -16,8 +16,10 @@ class MovieFixture : public ::testing::Test {
   protected:
     using Status = MediaFileWriter::Status;
 
-    TemporaryFolder folder;
-    const std::string path = folder / "movie.mp4";
+    std::string inFolder(const std::string& name) const { return folder.path() + "/" + name; }
+
+    TemporaryDirectory folder;
+    const std::string path = inFolder("movie.mp4");
     LogRecorder log;
     LavMediaService service{std::make_shared<HostFileSystem>()};
 };
