@@ -42,11 +42,14 @@ void KVRecordingSession::finishBroadcast(MovieHandler completion) {
 
 void KVRecordingSession::finishMovie(double startClipDuration, double endClipDuration,
                                      MovieHandler completion) {
-    // The session is kept until whoever finished it has heard of the movie.
-    const auto deliver = [self = shared_from_this(), startClipDuration, endClipDuration,
+    const auto deliver = [weak = weak_from_this(), startClipDuration, endClipDuration,
                           completion = std::move(completion)](const std::optional<URL>& movieURL) {
         KVLog("KVRecordingSession: finishWritingWithHandler");
-        self->deliverMovie(movieURL, startClipDuration, endClipDuration, completion);
+        if (const auto self = weak.lock()) {
+            self->deliverMovie(movieURL, startClipDuration, endClipDuration, completion);
+        } else {
+            completion(movieURL, std::nullopt);  // the movie is there, whoever recorded it
+        }
     };
     if (const auto writer = movieWriter()) {
         writer->finishWritingWithHandler(deliver);

@@ -1,5 +1,4 @@
 #include "base/KVLog.h"
-#include "base/ScreenTransform.h"
 #include "ipc/KVIOSurfaceObject.h"
 #include "session/KVRecordingSession.h"
 #include "session/SampleRebase.h"
@@ -88,7 +87,7 @@ void KVRecordingSession::routeVideo(const SampleBufferRef& sample, const ScreenT
     if (broadcastProcessMode() == BroadcastProcessMode::sampleBuffers) {
         if (const auto link = broadcastExtension())
             link->notifyExtensionOfVideoSampleBuffer(sample, SampleBuffer::Type::video,
-                                                     imageOrientation(flags));
+                                                     orientationFromVelaTransform(flags));
     } else if (!captureRecording_) {
         const auto writer = movieWriter();
         if (writer && !writer->appendVideoSampleBuffer(sample, transform))

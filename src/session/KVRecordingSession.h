@@ -2,6 +2,7 @@
 
 #include "base/Geometry.h"
 #include "base/Guarded.h"
+#include "base/ScreenTransform.h"
 #include "base/SerialQueue.h"
 #include "ipc/KVBroadcastConfiguration.h"
 #include "ipc/KVUserErrors.h"
@@ -132,6 +133,8 @@ class KVRecordingSession : public RecordingSession,
     // Names, made anew at every call: they carry the time.
     std::string outputPath() const;
     URL outputURL() const { return URL::file(outputPath()); }
+    /// Kept, but no name is ever taken from it.
+    void setOutputURL(URL url) { storedOutputURL_.set(std::move(url)); }
     std::string trimmedOutputPath() const;
     URL trimmedOutputURL() const { return URL::file(trimmedOutputPath()); }
 
@@ -161,6 +164,10 @@ class KVRecordingSession : public RecordingSession,
     Size _maximumSizeWithSize(const Size& size) const;
     std::int64_t chipId() const;
     std::string _serviceNameForReporting() const;
+    /// The orientation value, 1 to 8, that an extension gets with a frame.
+    static std::uint32_t orientationFromVelaTransform(const ScreenTransform& transformFlags) {
+        return imageOrientation(transformFlags);
+    }
 
     // `RecordingSession`.
     std::string bundleID() const override { return bundleID_; }
@@ -274,6 +281,7 @@ class KVRecordingSession : public RecordingSession,
     std::atomic<std::int32_t> frontmostPIDForAudioTap_{0};
     Guarded<std::optional<std::string>> bundleIDOfFirstForegroundApp_;
     Guarded<std::optional<URL>> interruptedMovieURL_;
+    Guarded<URL> storedOutputURL_;
     Guarded<std::optional<Date>> captureStartTime_;
     Guarded<Timeline> timeline_;
 

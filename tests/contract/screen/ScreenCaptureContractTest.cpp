@@ -170,6 +170,19 @@ TYPED_TEST(ScreenCaptureContract, RestartFromWithinAFrameGoesOn) {
     EXPECT_TRUE(this->awaitNumber(3));
 }
 
+TYPED_TEST(ScreenCaptureContract, RestartFromWithinAFrameCanBeStoppedThere) {
+    this->recorder_->onFrame([](ScreenCaptureSource& source, const auto&) {
+        source.stopCapture();
+        source.startCapture();
+        source.stopCapture();
+    });
+    this->start();
+    ASSERT_TRUE(this->screen_.eventually([&] { return this->recorder_->count() > 0; }));
+    this->screen_.show(1);
+    this->screen_.wait(200ms);
+    EXPECT_EQ(this->recorder_->count(), 1U);
+}
+
 TYPED_TEST(ScreenCaptureContract, StoppedSourceCanBeStartedAgain) {
     this->startAndAwaitFirstFrame();
     this->source_->stopCapture();

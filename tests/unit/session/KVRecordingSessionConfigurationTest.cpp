@@ -84,6 +84,11 @@ TEST_F(SessionFixture, InAppMovieIsNamedAfterTheApplication) {
     EXPECT_EQ(session->outputURL(), URL::file(std::string(kStore) + "Paint.mp4"));
 }
 
+TEST_F(SessionFixture, NameThatWasSetIsNotConsulted) {
+    session->setOutputURL(URL::file("/elsewhere.mp4"));
+    EXPECT_EQ(session->outputURL(), URL::file(std::string(kStore) + "Paint.mp4"));
+}
+
 TEST_F(SessionFixture, SystemMovieIsNamedAfterTheMoment) {
     makeSystemSession();
     const std::string expected = std::string(kStore) + "ScreenRecording_" +

@@ -20,6 +20,15 @@ TEST_F(SessionFixture, FinishYieldsTheMovie) {
     EXPECT_TRUE(delegate->stops.empty());
 }
 
+TEST_F(SessionFixture, MovieOfASessionThatIsGoneIsStillHandedOver) {
+    start();
+    finish(5, 2);
+    session.reset();
+    completeMovie(kMovie);
+    ASSERT_EQ(outcomes.size(), 1U);
+    EXPECT_EQ(outcomes.front().movieURL, kMovie);
+}
+
 TEST_F(SessionFixture, FinishOfAnIdleSessionIsNeverAnswered) {
     EXPECT_TRUE(finish().empty());
     EXPECT_FALSE(log.contains("KVRecordingSession: finishSessionWithHandler"));

@@ -9,6 +9,13 @@
 #include <utility>
 
 namespace kelvo::x11 {
+namespace {
+
+/// The source that the calling thread delivers for; only compared. Such a thread is in a delegate's call when
+/// it comes back to its source, and waiting there for that call to end would be waiting for itself.
+thread_local const ScreenCaptureSource* servedSource = nullptr;
+
+}  // namespace
 
 /// One start: its loop and the thread on which that runs.
 class X11ScreenCapture::Run : public std::enable_shared_from_this<Run> {
@@ -17,17 +24,19 @@ class X11ScreenCapture::Run : public std::enable_shared_from_this<Run> {
 
     explicit Run(CaptureSettings settings) : loop_(std::move(settings)) {}
     ~Run() {
-        if (thread_.joinable()) isOwnThread() ? thread_.detach() : thread_.join();
+        if (!thread_.joinable()) return;
+        // The last reference may go in a delegate's call.
+        thread_.get_id() == std::this_thread::get_id() ? thread_.detach() : thread_.join();
     }
     Run(const Run&) = delete;
     Run& operator=(const Run&) = delete;
 
     /// Runs once the run before it has left its thread, so that a delegate is never called twice at once.
-    void start(std::shared_ptr<Run> before, FailureHandler onFailure) {
+    void start(const ScreenCaptureSource* source, std::shared_ptr<Run> before, FailureHandler onFailure) {
         std::lock_guard lock(threadMutex_);
-        thread_ = std::thread([self = shared_from_this(), before = std::move(before),
+        thread_ = std::thread([self = shared_from_this(), source, before = std::move(before),
                                onFailure = std::move(onFailure)]() mutable {
-            self->threadID_ = std::this_thread::get_id();
+            servedSource = source;
             nameCurrentThread("com.quillon.kelvod.screen");
             if (before) before->waitForEnd();
             before.reset();
@@ -37,25 +46,19 @@ class X11ScreenCapture::Run : public std::enable_shared_from_this<Run> {
         });
     }
 
-    void stop() {
-        loop_.stop();
-        if (!isOwnThread()) waitForEnd();
+    void stop() { loop_.stop(); }
+    void waitForEnd() {
+        std::lock_guard lock(threadMutex_);
+        if (thread_.joinable()) thread_.join();
     }
 
     bool isActive() const { return !hasEnded_ && !loop_.isStopped(); }
 
   private:
-    void waitForEnd() {
-        std::lock_guard lock(threadMutex_);
-        if (thread_.joinable()) thread_.join();
-    }
-    bool isOwnThread() const { return threadID_ == std::this_thread::get_id(); }
-
     CaptureLoop loop_;
     std::atomic<bool> hasEnded_{false};
     std::mutex threadMutex_;  ///< held while the thread is waited for, which is done only once
     std::thread thread_;
-    std::atomic<std::thread::id> threadID_;
 };
 
 X11ScreenCapture::X11ScreenCapture(std::string display, const Size& size,
@@ -83,13 +86,16 @@ void X11ScreenCapture::startCapture() {
         return true;
     });
     if (!isNew) return;
-    next->start(std::move(before), [weak = weak_from_this()](ScreenCaptureStatus status) {
+    next->start(this, std::move(before), [weak = weak_from_this()](ScreenCaptureStatus status) {
         if (const auto self = weak.lock()) self->reportFailure(status);
     });
 }
 
 void X11ScreenCapture::stopCapture() {
-    if (const auto run = run_.copy()) run->stop();
+    const auto run = run_.copy();
+    if (!run) return;
+    run->stop();
+    if (servedSource != this) run->waitForEnd();
 }
 
 CaptureSettings X11ScreenCapture::settings() {
