@@ -12,7 +12,7 @@ namespace kelvo {
 namespace {
 
 /// Enough for nearly every fragment's header, so that one read does.
-constexpr std::size_t kFirstRead = 8 * 1024;
+constexpr std::size_t kFirstRead = 4 * 1024;
 
 KVError damaged() {
     return mediaError(kMediaErrorUnreadableMovie, "a fragment of the movie is damaged");
