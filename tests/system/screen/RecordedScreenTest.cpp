@@ -7,7 +7,7 @@
 #include "platform/simulated/SimulatedDevice.h"
 #include "session/KVRecordingSession.h"
 #include "support/Eventually.h"
-#include "support/media/TemporaryFolder.h"
+#include "support/TemporaryDirectory.h"
 #include "support/x11/XvfbServer.h"
 
 #include <future>
@@ -51,9 +51,8 @@ class RecordedScreen : public testing::Test {
         awaitFirstFrame();
     }
     void awaitFirstFrame() {
-        EXPECT_TRUE(eventually([this] {
-            return !session_->sessionWasResumed() && !session_->firstSampleTimestamp().isZero();
-        }));
+        EXPECT_TRUE(eventually(
+            [this] { return !session_->sessionWasResumed() && !session_->firstSampleTimestamp().isZero(); }));
         std::this_thread::sleep_for(50ms);
     }
     /// Lets the counter run and notes by how much the recording has moved its times.
@@ -108,7 +107,7 @@ class RecordedScreen : public testing::Test {
     }
 
     SimulatedDevice device_;
-    TemporaryFolder folder_;
+    TemporaryDirectory folder_;
     std::shared_ptr<const DeviceRoot> root_ = std::make_shared<const DeviceRoot>(folder_.path(), "");
     XvfbServer server_{kWidth, kHeight};
     std::shared_ptr<x11::X11Screen> screen_ = std::make_shared<x11::X11Screen>(server_.display());
