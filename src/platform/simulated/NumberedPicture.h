@@ -20,7 +20,7 @@ class NumberedPicture {
     static constexpr std::uint32_t kRows = 5;
 
     /// Whether the block is white, for every block, row by row.
-    using Blocks = std::array<bool, kColumns * kRows>;
+    using Blocks = std::array<bool, std::size_t{kColumns} * kRows>;
     static Blocks blocks(std::uint32_t number);
 
     static void draw(std::uint32_t number, const VideoSurface::Geometry& geometry,

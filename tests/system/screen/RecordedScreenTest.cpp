@@ -51,9 +51,8 @@ class RecordedScreen : public testing::Test {
         awaitFirstFrame();
     }
     void awaitFirstFrame() {
-        EXPECT_TRUE(eventually([this] {
-            return !session_->sessionWasResumed() && !session_->firstSampleTimestamp().isZero();
-        }));
+        EXPECT_TRUE(eventually(
+            [this] { return !session_->sessionWasResumed() && !session_->firstSampleTimestamp().isZero(); }));
         std::this_thread::sleep_for(50ms);
     }
     /// Lets the counter run and notes by how much the recording has moved its times.
