@@ -43,7 +43,8 @@ function(kelvo_test name)
     add_executable(${name} ${sources})
     target_include_directories(${name} PRIVATE ${CMAKE_SOURCE_DIR}/tests)
     target_link_libraries(${name} PRIVATE kelvo_settings ${ARG_DEPENDS} kelvo_test_support)
-    gtest_discover_tests(${name} DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 120)
+    gtest_discover_tests(${name} DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 120
+        ENVIRONMENT TSAN_OPTIONS=suppressions=${CMAKE_SOURCE_DIR}/tests/tsan-suppressions.txt)
 endfunction()
 
 # kelvo_loads_modules(TARGET): the program TARGET may load our modules, which use its base library: all of it is

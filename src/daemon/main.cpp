@@ -4,6 +4,7 @@
 #include "platform/linux/bundles/LinuxBundleService.h"
 #include "platform/linux/bundles/LocaleLanguages.h"
 #include "platform/linux/files/LinuxFileSystem.h"
+#include "platform/linux/files/WritableDirectory.h"
 #include "platform/linux/log/JournalLog.h"
 #include "platform/linux/log/Readiness.h"
 #include "platform/linux/log/StderrLog.h"
@@ -27,7 +28,6 @@
 #include <cerrno>
 #include <cstdio>
 #include <sys/stat.h>
-#include <unistd.h>
 
 namespace kelvo {
 namespace {
@@ -74,14 +74,6 @@ int cannotUseRoot(const Options& options, const KVError& error) {
     return cannotStart("cannot use the root " + options.root + ": " + error.localizedDescription(), 1);
 }
 
-/// Makes the store, so that a root that cannot be written is known before anybody wants to record.
-OptionalError checkStore(const DeviceRoot& root, FileSystem& files) {
-    const std::string store = KVTemporaryFileStore::_srTempPath();
-    if (OptionalError error = files.createDirectory(store)) return error;
-    const std::string hostPath = root.hostPath(store);
-    return ::access(hostPath.c_str(), W_OK) == 0 ? OptionalError() : KVError::posix(errno, hostPath);
-}
-
 int run(const Options& options) {
     std::atomic<bool> isTerminated{false};
     TerminationSignals signals;
@@ -95,9 +87,10 @@ int run(const Options& options) {
         return cannotStart("another kelvod runs on the root " + options.root, 1);
     }
     if (!lock) return cannotUseRoot(options, lock.error());
+    // A root that cannot be written is better known now than when somebody wants to record.
+    const OptionalError error = makeWritableDirectory(root->hostPath(KVTemporaryFileStore::_srTempPath()));
+    if (error) return cannotUseRoot(options, *error);
     const Platform platform = linuxPlatform(root);
-    if (const OptionalError error = checkStore(*root, *platform.fileSystem))
-        return cannotUseRoot(options, *error);
 
     signals.watch([&isTerminated, mainQueue = platform.mainQueue] {
         isTerminated = true;

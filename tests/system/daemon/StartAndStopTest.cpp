@@ -79,8 +79,8 @@ TEST_F(StartAndStopTest, StoreThatCannotBeMadeIsOneLineAndAFailure) {
     root.write("private", "in the way");
     test::ChildProcess daemon = start({"--root", root.path()});
     EXPECT_EQ(daemon.waitForExit(), 1);
-    EXPECT_EQ(daemon.output(), "kelvod: cannot use the root " + root.path() +
-                                   ": /private/var/mobile/Library/KelvoKit/: Not a directory\n");
+    EXPECT_EQ(daemon.output(), "kelvod: cannot use the root " + root.path() + ": " + root.path() +
+                                   "/private/var/mobile/Library/KelvoKit/: Not a directory\n");
 }
 
 TEST_F(StartAndStopTest, UnknownOptionIsOneLineAndAWrongUsage) {

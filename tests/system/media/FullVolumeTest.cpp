@@ -88,16 +88,16 @@ TEST_F(FullVolumeTest, MovieWriterBeginsAgainFromTheNextFrame) {
     writer->startWritingHandler(nullptr);
     writer->movieWriterQueue().sync([] {});
     GlobalQueue::drain();
-    const auto first = writer->assetWriter();
+    auto first = writer->assetWriter();
     std::int64_t time = kSecond;
     for (int i = 0; i < kEnough && first->status() != Status::failed; ++i, time += kFrame) {
         writer->appendVideoSampleBuffer(noise(time), {});
         std::this_thread::sleep_for(std::chrono::milliseconds(1));
     }
     ASSERT_EQ(first->status(), Status::failed);
+    first.reset();  // holds the removed file open, and with it the room that the next one needs
     writer->appendVideoSampleBuffer(testFrame({320, 240}, 0, time), {});
     GlobalQueue::drain();
-    ASSERT_NE(writer->assetWriter(), first);
     EXPECT_EQ(writer->assetWriter()->status(), Status::writing);
     for (int i = 1; i < 10; ++i) {
         while (!writer->videoInput()->isReadyForMoreMediaData())

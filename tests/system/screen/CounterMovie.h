@@ -21,9 +21,9 @@ inline std::vector<CounterFrame> readCounterMovie(const std::string& path) {
     constexpr std::uint32_t kWidth = 80;
     constexpr std::uint32_t kHeight = 50;
     const std::vector<double> times = frameTimes(path, "v:0");
-    const std::string pixels =
-        outputOf("ffmpeg -v error -i '" + path +
-                 "' -map 0:v:0 -fps_mode passthrough -enc_time_base -1 -vf scale=80:50:flags=area -pix_fmt gray -f rawvideo -");
+    const std::string pixels = outputOf("ffmpeg -v error -i '" + path +
+                                        "' -map 0:v:0 -fps_mode passthrough -enc_time_base -1 -vf "
+                                        "scale=80:50:flags=area -pix_fmt gray -f rawvideo -");
     std::vector<CounterFrame> frames;
     for (std::size_t i = 0; i < times.size() && (i + 1) * kWidth * kHeight <= pixels.size(); ++i) {
         const auto* const picture =
@@ -37,8 +37,9 @@ inline std::vector<CounterFrame> readCounterMovie(const std::string& path) {
 
 /// Whether any pixel of any frame is clearly green.
 inline bool showsGreen(const std::string& path) {
-    const std::string pixels = outputOf("ffmpeg -v error -i '" + path +
-                                        "' -map 0:v:0 -fps_mode passthrough -enc_time_base -1 -pix_fmt rgb24 -f rawvideo -");
+    const std::string pixels =
+        outputOf("ffmpeg -v error -i '" + path +
+                 "' -map 0:v:0 -fps_mode passthrough -enc_time_base -1 -pix_fmt rgb24 -f rawvideo -");
     for (std::size_t i = 0; i + 2 < pixels.size(); i += 3) {
         const auto at = [&](std::size_t index) { return int{static_cast<unsigned char>(pixels[index])}; };
         if (at(i + 1) > std::max(at(i), at(i + 2)) + 60) return true;
