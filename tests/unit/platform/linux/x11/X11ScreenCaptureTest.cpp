@@ -131,8 +131,8 @@ TEST_F(X11ScreenCaptureTest, ShrinkingScreenIsFollowedWhileItIsDrawnOn) {
 
 TEST_F(X11ScreenCaptureTest, StartsAndStopsLeaveNothingBehind) {
     const auto cycle = [&] {
-        source_->startCapture();
         const auto count = recorder_->count();
+        source_->startCapture();
         EXPECT_TRUE(eventually([&] { return recorder_->count() > count; }));
         source_->stopCapture();
     };
