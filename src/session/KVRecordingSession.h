@@ -20,7 +20,18 @@ class KVRecordingSession : public RecordingSession {
     bool isBroadcasting() const override { return false; }
     bool isSystemRecording() const override { return false; }
     ClientProxyRef clientProxy() const override { return clientProxy_.copy(); }
-    void setClientProxy(ClientProxyRef proxy) { clientProxy_.set(std::move(proxy)); }
+    void setClientProxy(ClientProxyRef proxy) override { clientProxy_.set(std::move(proxy)); }
+
+    bool isPaused() const override { return false; }
+    bool microphoneEnabled() const override { return microphoneEnabled_; }
+    void setMicrophoneEnabled(bool enabled) override { microphoneEnabled_ = enabled; }
+    bool microphoneEnabledPersistent() const override { return microphoneEnabledPersistent_; }
+    void setMicrophoneEnabledPersistent(bool enabled) override { microphoneEnabledPersistent_ = enabled; }
+    bool hasUserConsentForCamera() const override { return hasUserConsentForCamera_; }
+    void setHasUserConsentForCamera(bool consent) override { hasUserConsentForCamera_ = consent; }
+    bool hasUserConsentForMicrophone() const override { return hasUserConsentForMicrophone_; }
+    void setHasUserConsentForMicrophone(bool consent) override { hasUserConsentForMicrophone_ = consent; }
+    void pauseSession() override {}
 
     void setRecording(bool) override {}
     void setPaused(bool) override {}
@@ -37,6 +48,10 @@ class KVRecordingSession : public RecordingSession {
   private:
     const std::string bundleID_;
     Guarded<ClientProxyRef> clientProxy_;
+    std::atomic<bool> microphoneEnabled_{false};
+    std::atomic<bool> microphoneEnabledPersistent_{false};
+    std::atomic<bool> hasUserConsentForCamera_{false};
+    std::atomic<bool> hasUserConsentForMicrophone_{false};
 };
 
 }  // namespace kelvo

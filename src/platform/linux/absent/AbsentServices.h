@@ -77,13 +77,20 @@ class UnreachableTransport : public IPCTransport {
     std::shared_ptr<IPCListener> createListener(std::string_view) override {
         return std::make_shared<Listener>();
     }
-    std::shared_ptr<IPCConnection> currentConnection() override { return nullptr; }
+    Result<std::shared_ptr<IPCListener>> createAnonymousListener() override { return unreachable(); }
+    Result<IPCConnectionRef> connectToService(std::string_view) override { return unreachable(); }
+    Result<IPCConnectionRef> connectToEndpoint(const std::shared_ptr<IPCEndpoint>&) override {
+        return unreachable();
+    }
+    IPCConnectionRef currentConnection() override { return nullptr; }
 
   private:
+    static KVError unreachable() { return KVError::posix(ENOSYS, "connection"); }
     class Listener : public IPCListener {
       public:
         void setDelegate(std::weak_ptr<IPCListenerDelegate>) override {}
         void resume() override {}
+        std::shared_ptr<IPCEndpoint> endpoint() const override { return nullptr; }
     };
 };
 
