@@ -4,6 +4,7 @@
 #include "platform/linux/bundles/LinuxBundleService.h"
 #include "platform/linux/bundles/LocaleLanguages.h"
 #include "platform/linux/files/LinuxFileSystem.h"
+#include "platform/linux/ipc/SocketTransport.h"
 #include "platform/linux/log/JournalLog.h"
 #include "platform/linux/log/Readiness.h"
 #include "platform/linux/log/StderrLog.h"
@@ -51,7 +52,7 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     platform.displayLayout = std::make_shared<UnchangingDisplayLayout>();
     platform.bulletins = std::make_shared<InvisibleBulletins>();
     platform.alerts = std::make_shared<ShelllessAlerts>();
-    platform.ipc = std::make_shared<UnreachableTransport>();
+    platform.ipc = std::make_shared<SocketTransport>(root, platform.bundles);
     return platform;
 }
 

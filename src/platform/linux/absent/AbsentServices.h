@@ -3,7 +3,6 @@
 #include "platform/BulletinService.h"
 #include "platform/CallObserver.h"
 #include "platform/DisplayLayout.h"
-#include "platform/IPC.h"
 #include "platform/RestrictionsProfile.h"
 #include "platform/SystemAlert.h"
 
@@ -69,29 +68,6 @@ class ShelllessAlerts : public SystemAlertService {
     Result<std::shared_ptr<SystemAlert>> createAlert(const SystemAlertContent&) override {
         return KVError::posix(ENOSYS, "no system shell shows alerts");
     }
-};
-
-/// A transport that no client can reach.
-class UnreachableTransport : public IPCTransport {
-  public:
-    std::shared_ptr<IPCListener> createListener(std::string_view) override {
-        return std::make_shared<Listener>();
-    }
-    Result<std::shared_ptr<IPCListener>> createAnonymousListener() override { return unreachable(); }
-    Result<IPCConnectionRef> connectToService(std::string_view) override { return unreachable(); }
-    Result<IPCConnectionRef> connectToEndpoint(const std::shared_ptr<IPCEndpoint>&) override {
-        return unreachable();
-    }
-    IPCConnectionRef currentConnection() override { return nullptr; }
-
-  private:
-    static KVError unreachable() { return KVError::posix(ENOSYS, "connection"); }
-    class Listener : public IPCListener {
-      public:
-        void setDelegate(std::weak_ptr<IPCListenerDelegate>) override {}
-        void resume() override {}
-        std::shared_ptr<IPCEndpoint> endpoint() const override { return nullptr; }
-    };
 };
 
 }  // namespace kelvo
