@@ -237,6 +237,15 @@ TEST_F(SocketTransportTest, EveryCallbackArrivesAsItWasSent) {
     EXPECT_EQ(writable, MAP_FAILED) << "a receiver can map the pixels but not write them";
 }
 
+TEST_F(SocketTransportTest, CallbackSentBeforeAuthenticationWaitsForItsEnd) {
+    const auto connection = *transport->connectToService("com.quillon.kelvod");
+    KVClientProxy proxy(acceptedLast());
+    proxy.recordingTimerDidUpdate("00:01");  // the client has not said a word yet
+    const Client client = setUp(connection);
+    ASSERT_TRUE(eventually([&] { return !client.callbacks->messages().empty(); }));
+    EXPECT_THAT(client.callbacks->timerTexts.copy(), ElementsAre("00:01"));
+}
+
 TEST_F(SocketTransportTest, LostPeerIsAnInterruptionAndThenAnInvalidation) {
     const Client client = connect();
     acceptedLast()->invalidate();

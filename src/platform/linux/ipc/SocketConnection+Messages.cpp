@@ -238,6 +238,7 @@ void SocketConnection::afterPush(bool isWithinBounds) {
 
 SocketConnection::Flushed SocketConnection::flush(int socket) {
     const std::lock_guard lock(outMutex_);
+    if (!maySend()) return Flushed::some;
     while (!out_.queue.empty()) {
         Outgoing& next = out_.queue.front();
         alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int) * ipc_bounds::kMostDescriptors)> control{};

@@ -67,11 +67,10 @@ bool SocketConnection::isPaused() const {
 void SocketConnection::arm() {
     const Socket held = socket();
     if (!held || token_ == 0) return;
+    // Under the lock, so that the latest look at the queue is also the latest to be armed.
+    const std::lock_guard lock(outMutex_);
     std::uint32_t events = isPaused() ? 0U : EPOLLIN;
-    {
-        const std::lock_guard lock(outMutex_);
-        if (!out_.queue.empty()) events |= EPOLLOUT;
-    }
+    if (maySend() && !out_.queue.empty()) events |= EPOLLOUT;
     if (events != 0) loop_->arm(held->get(), token_, events);
 }
 
@@ -155,7 +154,7 @@ bool SocketConnection::authenticate() {
     if (!answers.empty() && held &&
         ::send(held->get(), answers.data(), answers.size(), MSG_NOSIGNAL | MSG_DONTWAIT) !=
             static_cast<ssize_t>(answers.size()))
-        return cutOff("authentication that is not read"), false;
+        return errno == EPIPE ? end(State::lost) : cutOff("authentication that is not read"), false;
     if (state == Talk::failed) return cutOff("authentication failed"), false;
     isAuthenticated_ = state == Talk::done;
     return isAuthenticated_;

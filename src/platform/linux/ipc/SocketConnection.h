@@ -60,6 +60,8 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
 
     Socket socket() const { return socket_.copy(); }
     bool isPaused() const;
+    /// A server says nothing before the conversation's end; a client's greeting is the first thing it sends.
+    bool maySend() const { return side_ == Side::client || isAuthenticated_; }
     void arm();
     void receive(int socket);
     bool receiveSome(int socket);
@@ -93,9 +95,9 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     Bytes incoming_;
     std::vector<UniqueFd> receivedDescriptors_;
     std::optional<dbus::ServerAuthentication> authentication_;
-    bool isAuthenticated_ = false;
     std::optional<Moment> deadline_;
 
+    std::atomic<bool> isAuthenticated_{false};
     std::shared_ptr<std::atomic<std::size_t>> owedReplies_ = std::make_shared<std::atomic<std::size_t>>(0);
     std::mutex outMutex_;
     Out out_;
