@@ -5,6 +5,7 @@
 #include "platform/linux/bundles/LocaleLanguages.h"
 #include "platform/linux/files/LinuxFileSystem.h"
 #include "platform/linux/files/WritableDirectory.h"
+#include "platform/linux/ipc/SocketTransport.h"
 #include "platform/linux/log/JournalLog.h"
 #include "platform/linux/log/Readiness.h"
 #include "platform/linux/log/StderrLog.h"
@@ -59,9 +60,9 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     platform.analytics = std::make_shared<UngatheredAnalytics>();
     platform.bulletins = std::make_shared<InvisibleBulletins>();
     platform.alerts = std::make_shared<ShelllessAlerts>();
-    platform.ipc = std::make_shared<UnreachableTransport>();
     platform.media =
         std::make_shared<LoadedMediaService>(platform.fileSystem, LoadedMediaService::usualFolders());
+    platform.ipc = std::make_shared<SocketTransport>(root, platform.bundles);
     return platform;
 }
 

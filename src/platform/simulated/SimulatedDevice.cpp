@@ -58,7 +58,7 @@ Platform SimulatedDevice::platform() const {
 void SimulatedDevice::settle() {
     do {
         GlobalQueue::drain();
-    } while (mainQueue->runUntilIdle() > 0);
+    } while (mainQueue->runUntilIdle() > 0 || ipc->settle());
 }
 
 void SimulatedDevice::advance(std::chrono::nanoseconds interval) {

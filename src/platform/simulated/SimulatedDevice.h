@@ -43,7 +43,7 @@ class SimulatedDevice {
     /// The services to hand to the logic.
     Platform platform() const;
 
-    /// Runs main-queue tasks, due timers and global-queue work until none is left.
+    /// Runs main-queue tasks, due timers, global-queue work and messages until none is left.
     void settle();
     /// Moves the clock, lets the screen deliver what that made due, and settles.
     void advance(std::chrono::nanoseconds interval);
