@@ -36,14 +36,15 @@ function(kelvo_library name)
     target_link_libraries(${name} PUBLIC kelvo_settings ${ARG_DEPENDS})
 endfunction()
 
-# kelvo_test(NAME [DEPENDS target...]): a GoogleTest program from all sources of the current folder.
+# kelvo_test(NAME [SERIAL] [DEPENDS target...]): a GoogleTest program from all sources of the current folder. SERIAL: its
+# tests look at the clock of the wall and run while no other test does.
 function(kelvo_test name)
-    cmake_parse_arguments(ARG "" "" "DEPENDS" ${ARGN})
+    cmake_parse_arguments(ARG "SERIAL" "" "DEPENDS" ${ARGN})
     file(GLOB sources CONFIGURE_DEPENDS *.cpp)
     add_executable(${name} ${sources})
     target_include_directories(${name} PRIVATE ${CMAKE_SOURCE_DIR}/tests)
     target_link_libraries(${name} PRIVATE kelvo_settings ${ARG_DEPENDS} kelvo_test_support)
-    gtest_discover_tests(${name} DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 120
+    gtest_discover_tests(${name} DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 120 RUN_SERIAL ${ARG_SERIAL}
         ENVIRONMENT TSAN_OPTIONS=suppressions=${CMAKE_SOURCE_DIR}/tests/tsan-suppressions.txt)
 endfunction()
 

