@@ -151,8 +151,7 @@ OptionalError ConnectionBase::trySend(std::size_t method, const Array& arguments
         } while (identifier == 0);
         awaitedReplies_.with([&](auto& replies) { replies.emplace(identifier, std::move(awaited)); });
     }
-    const OptionalError error =
-        isOver() ? connectionOver() : transmit(method, description, arguments, identifier);
+    OptionalError error = isOver() ? connectionOver() : transmit(method, description, arguments, identifier);
     if (identifier == 0) return error;
     if (!error && !isOver()) return std::nullopt;
     // The connection may have ended meanwhile and reported this reply: whoever takes it reports.

@@ -16,7 +16,7 @@ void SimulatedConnection::join(const SimulatedConnectionRef& one, const Simulate
     other->peer_.set(one);
 }
 
-void SimulatedConnection::sendRaw(std::size_t method, Array arguments) {
+void SimulatedConnection::sendRaw(std::size_t method, const Array& arguments) {
     if (const auto receiver = peer()) receiver->deliver(method, arguments, 0);
 }
 

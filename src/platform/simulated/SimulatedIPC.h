@@ -31,7 +31,7 @@ class SimulatedConnection : public ConnectionBase {
     }
 
     /// Sends a message as a peer could that keeps no rule: the arguments need not fit.
-    void sendRaw(std::size_t method, Array arguments);
+    void sendRaw(std::size_t method, const Array& arguments);
     /// Waits until everything has run that arrived so far; says how much that was since the connection began.
     std::uint64_t drain();
 

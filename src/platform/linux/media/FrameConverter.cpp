@@ -1,6 +1,7 @@
 #include "platform/linux/media/FrameConverter.h"
 
 #include <algorithm>
+#include <cmath>
 #include <cstring>
 
 #include <libyuv.h>
@@ -10,7 +11,7 @@ namespace {
 
 /// Sides and positions of pictures are even, as their colour planes have half the size.
 int even(double number) {
-    return static_cast<int>(number / 2 + 0.5) * 2;
+    return static_cast<int>(std::lround(number / 2)) * 2;
 }
 
 int stride(const VideoSurface& surface) {

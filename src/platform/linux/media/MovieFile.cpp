@@ -56,7 +56,7 @@ OptionalError MovieFile::writeHeader() {
     const std::size_t padding = (8 - writer.position() % 8) % 8;
     writer.box("free", [&] { writer.zeros(padding); });
     const std::span<const std::byte> header(writer.bytes());
-    const OptionalError error = commit(header.first(kHeadSize), {header.subspan(kHeadSize)});
+    OptionalError error = commit(header.first(kHeadSize), {header.subspan(kHeadSize)});
     headerEnd_ = end_;
     return error;
 }

@@ -71,7 +71,7 @@ void MovieReader::findDurationOfFragments() {
     for (AVStream* each : streams) {
         each->discard = AVDISCARD_DEFAULT;
         if (each->duration == AV_NOPTS_VALUE) continue;
-        const std::int64_t duration = av_rescale_q(each->duration, each->time_base, AV_TIME_BASE_Q);
+        const std::int64_t duration = av_rescale_q(each->duration, each->time_base, {1, AV_TIME_BASE});
         context_->duration = std::max(context_->duration, duration);
     }
     static_cast<void>(avformat_seek_file(context_.get(), -1, INT64_MIN, 0, 0, 0));
