@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/Platform.h"
+#include "platform/simulated/SimulatedAudio.h"
 #include "platform/simulated/SimulatedBundles.h"
 #include "platform/simulated/SimulatedClock.h"
 #include "platform/simulated/SimulatedEnvironment.h"
@@ -59,6 +60,9 @@ class SimulatedDevice {
     /// The display shows one element for each level.
     void setLayout(const std::vector<int>& levels);
     void setFreeSpace(std::uint64_t bytes) { fileSystem->setFreeSpace(bytes); }
+    /// The microphone is taken away, or comes back.
+    void takeMicrophone() { audio->interrupt(); }
+    void giveMicrophoneBack() { audio->endInterruption(); }
     void answerAlert(SystemAlertResponse response) { alerts->answer(response); }
 
     /// The next call of "Service.operation" (the names that the twins use, as in "FileSystem.removeItem")
@@ -69,8 +73,9 @@ class SimulatedDevice {
 
     /// One line of a script: "lock", "unlock", "ring", "dial", "hang-up", "forbid-recording",
     /// "allow-recording", "layout LEVEL...", "free-space BYTES", "advance SECONDS", "answer
-    /// default|alternate|other|cancelled", "fail OPERATION ERRNO", "purge URGENCY" or "settle". Fails, having
-    /// done nothing, on anything else.
+    /// default|alternate|other|cancelled", "fail OPERATION ERRNO", "purge URGENCY", "take-microphone",
+    /// "give-microphone-back", "sound SECONDS" (advances the clock; what is heard meanwhile is captured) or
+    /// "settle". Fails, having done nothing, on anything else.
     OptionalError perform(std::string_view line);
 
     const std::shared_ptr<SimulatedFaults> faults;
@@ -85,6 +90,7 @@ class SimulatedDevice {
     const std::shared_ptr<SimulatedDeviceProperties> device;
     const std::shared_ptr<SimulatedNotifications> notifications;
     const std::shared_ptr<SimulatedStoragePurge> storagePurge;
+    const std::shared_ptr<SimulatedAudio> audio;
     const std::shared_ptr<SimulatedCallObserver> calls;
     const std::shared_ptr<SimulatedRestrictions> restrictions;
     const std::shared_ptr<SimulatedDisplayLayout> displayLayout;
