@@ -26,7 +26,8 @@ enum AudioSessionOption : std::uint32_t {
 /// device; used by the capture manager. Thread-safe.
 class AudioSession {
   public:
-    /// Runs on a thread of the adapter. It must not call back into the audio service.
+    /// Runs on any thread, behind the samples that came before the interruption. It must not call back into
+    /// the audio service.
     using InterruptionHandler = std::function<void(std::uint64_t type)>;
 
     virtual ~AudioSession() = default;

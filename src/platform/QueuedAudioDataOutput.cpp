@@ -20,4 +20,8 @@ void QueuedAudioDataOutput::deliver(const SampleBufferRef& sample, CaptureConnec
     });
 }
 
+void QueuedAudioDataOutput::afterSamples(Task task) {
+    if (const auto queue = receiver_.copy().queue) queue->async(std::move(task));
+}
+
 }  // namespace kelvo

@@ -20,6 +20,9 @@ class QueuedAudioDataOutput : public AudioDataOutput,
 
     void deliver(const SampleBufferRef& sample, CaptureConnection connection, IsWanted isWanted);
 
+    /// Runs `task` on the delegate's queue behind what was delivered; not at all without a queue.
+    void afterSamples(Task task);
+
   private:
     struct Receiver {
         std::weak_ptr<CaptureOutputDelegate> delegate;

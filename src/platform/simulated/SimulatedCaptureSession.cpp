@@ -31,8 +31,8 @@ void SimulatedCaptureSession::capture(const SimulatedTone& tone, std::chrono::na
         if (!audioOutput || !isWanted(output)) continue;
         Bytes bytes(static_cast<std::size_t>(frames) * format.bytesPerFrame);
         writeTone(tone, format, start, frames, bytes.data());
-        const TimingRecord timing{MediaTime::make(frames, 44100),
-                                  MediaTime::make(start.count(), 1000000000), MediaTime::invalid()};
+        const TimingRecord timing{MediaTime::make(frames, 44100), MediaTime::make(start.count(), 1000000000),
+                                  MediaTime::invalid()};
         audioOutput->deliver(SampleBuffer::audio(format, std::move(bytes), frames, timing),
                              {SimulatedCaptureDevice().name()}, isWanted);
     }

@@ -256,8 +256,8 @@ INSTANTIATE_TEST_SUITE_P(Lines, BadScriptLineTest,
                                          "advance -1", "advance nan", "advance inf", "advance 1e10",
                                          "advance 1s", "answer", "answer maybe", "answer default other",
                                          "fail", "fail FileSystem.removeItem", "fail FileSystem.removeItem x",
-                                         "purge", "purge much", "sound", "sound 61", "sound x", "settle now", "forbid-recording 1",
-                                         "allow-recording 1", "hang-up 1", "dial 1"));
+                                         "purge", "purge much", "sound", "sound 61", "sound x", "settle now",
+                                         "forbid-recording 1", "allow-recording 1", "hang-up 1", "dial 1"));
 
 }  // namespace
 }  // namespace kelvo
