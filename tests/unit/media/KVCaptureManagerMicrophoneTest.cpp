@@ -137,6 +137,7 @@ TEST_F(KVCaptureManagerMicrophoneTest, StartWithoutOutputKeepsTheOneBefore) {
     startMicrophone();
     manager->stopMicrophoneCapture();
     manager->startMicrophoneCaptureWithOutput(nullptr, nullptr);
+    settle();
     hear(100ms);
     EXPECT_EQ(microphone.copy().size(), 1U);
 }
@@ -407,6 +408,7 @@ TEST_F(KVCaptureManagerMicrophoneTest, StopAllForgetsHandlersAndTimes) {
     EXPECT_EQ(manager->lastAudioDate(), std::nullopt);
     EXPECT_FALSE(device.audio->captureSession()->isRunning());
     manager->startMicrophoneCaptureWithOutput(nullptr, nullptr);
+    settle();
     hear(100ms);
     EXPECT_EQ(microphone.copy().size(), 1U) << "the handler of before is gone";
 }
