@@ -16,6 +16,7 @@ TEST_F(MicrophoneTest, TrackHoldsWhatTheMicrophoneHears) {
     const auto application = server.play(1000, "speaker");
     startMicrophone();
     ASSERT_TRUE(hears(microphone, 440));
+    microphone.next(1);  // what the server says first of its latency is some milliseconds off
     const auto heard = microphone.next(1);
     EXPECT_NEAR(amplitudeIn(heard, 440), kPlayed, kPlayed / 20);
     EXPECT_LT(test::ratioInDecibels(amplitudeIn(heard, 1000), amplitudeIn(heard, 440)), -60);
@@ -26,6 +27,7 @@ TEST_F(MicrophoneTest, TrackHoldsWhatTheMicrophoneHears) {
 
 TEST_F(MicrophoneTest, SilentMicrophoneYieldsSilenceNotAGap) {
     startMicrophone();
+    microphone.next(1);  // what the server says first of its latency is some milliseconds off
     const auto heard = microphone.next(1);
     EXPECT_LT(amplitudeIn(heard, 440), 1);
     EXPECT_LT(test::worstSeam(heard), 0.002);
