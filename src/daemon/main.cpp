@@ -11,6 +11,7 @@
 #include "platform/linux/log/StderrLog.h"
 #include "platform/linux/media_loader/LoadedMediaService.h"
 #include "platform/linux/notifications/LinuxNotificationCenter.h"
+#include "platform/linux/pulse/PulseAudioService.h"
 #include "platform/linux/settings/DeviceFile.h"
 #include "platform/linux/settings/JsonPreferences.h"
 #include "platform/linux/storage/VolumeWatcher.h"
@@ -50,6 +51,7 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     platform.notifications = std::make_shared<LinuxNotificationCenter>(root);
     platform.storagePurge = std::make_shared<VolumeWatcher>(platform.fileSystem, platform.clock,
                                                             KVTemporaryFileStore::_srTempPath());
+    platform.audio = std::make_shared<pulse::PulseAudioService>(platform.clock);
     platform.calls = std::make_shared<SilentCallObserver>();
     platform.restrictions = std::make_shared<UnrestrictedProfile>();
     platform.displayLayout = std::make_shared<UnchangingDisplayLayout>();
