@@ -65,6 +65,45 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
     void failedToSaveRecordingForRecordingSession(const SessionRef& session, const KVError& error) override;
     void saveVideoToCameraRoll(const std::optional<URL>& movieURL, ErrorHandler completion) override;
 
+    // Client requests, on the connection manager's queue. One that the daemon does not offer yet is answered
+    // with an error of the domain; without a handler to tell it to, it is logged and does nothing.
+    void startRecordingWindowLayerContextIDs(const std::vector<std::uint32_t>& windowLayerContextIDs,
+                                             const Size& windowSize, bool microphoneEnabled,
+                                             bool cameraEnabled, bool broadcast, bool systemRecording,
+                                             bool captureEnabled,
+                                             const std::shared_ptr<IPCEndpoint>& listenerEndpoint,
+                                             StartHandler handler) override;
+    void setupBroadcastWithHostBundleID(const std::string& hostBundleID,
+                                        const std::string& broadcastExtensionBundleID,
+                                        const Bytes& broadcastConfigurationData, const Dictionary& userInfo,
+                                        ErrorHandler handler) override;
+    void getCurrentBroadcastImages(ImagesHandler handler) override;
+    void getSystemBroadcastExtensionInfo(ExtensionsHandler handler) override;
+    void stopRecordingWithHandler(MovieHandler handler) override;
+    void stopRecordingWithStartClipDuration(double startClipDuration, double endClipDuration,
+                                            MovieHandler handler) override;
+    void saveVideoToCameraRoll(const URL& movieURL, ErrorHandler handler) override;
+    void pauseRecording() override;
+    void resumeRecordingWithWindowLayerContextID(std::uint32_t windowLayerContextID) override;
+    void setMicrophoneEnabled(bool enabled) override;
+    void updateProcessIDForAudioCaptureWithPID(std::int32_t processIdentifier) override;
+    void discardRecordingWithHandler(DoneHandler handler) override;
+    void synchronousGetCurrentState(StateHandler handler) override;
+    void synchronousIsBroadcastingWithPreferredExtension(const std::string& preferredExtension,
+                                                         BooleanHandler handler) override;
+    void setHasUserConsentForCamera(bool consent) override;
+    void setHasUserConsentForMicrophone(bool consent) override;
+    void setBroadcastURL(const URL& broadcastURL) override;
+    void setMicrophoneEnabledPersistent(bool enabled) override;
+    void reportCameraUsage(std::int32_t cameraUsage) override;
+
+    // Clients that come and go, on a thread of the transport.
+    /// Gives the bundle's session its client. A client without a bundle gets neither.
+    void connectionManagerDidAcceptNewConnection(const IPCConnectionRef& connection,
+                                                 const std::optional<std::string>& bundleIdentifier) override;
+    void applicationDisconnectedWithBundleID(const std::optional<std::string>& bundleIdentifier,
+                                             std::int32_t processIdentifier) override;
+
     // What the world around a recording does.
     void callObserverCallChanged(CallObserver& observer, const Call& call) override;
     void profileConnectionDidReceiveEffectiveSettingsChangedNotification(

@@ -5,11 +5,13 @@
 #include "platform/linux/bundles/LocaleLanguages.h"
 #include "platform/linux/files/LinuxFileSystem.h"
 #include "platform/linux/files/WritableDirectory.h"
+#include "platform/linux/ipc/SocketTransport.h"
 #include "platform/linux/log/JournalLog.h"
 #include "platform/linux/log/Readiness.h"
 #include "platform/linux/log/StderrLog.h"
 #include "platform/linux/media_loader/LoadedMediaService.h"
 #include "platform/linux/notifications/LinuxNotificationCenter.h"
+#include "platform/linux/pulse/PulseAudioService.h"
 #include "platform/linux/settings/DeviceFile.h"
 #include "platform/linux/settings/JsonPreferences.h"
 #include "platform/linux/storage/VolumeWatcher.h"
@@ -49,6 +51,7 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     platform.notifications = std::make_shared<LinuxNotificationCenter>(root);
     platform.storagePurge = std::make_shared<VolumeWatcher>(platform.fileSystem, platform.clock,
                                                             KVTemporaryFileStore::_srTempPath());
+    platform.audio = std::make_shared<pulse::PulseAudioService>(platform.clock);
     platform.calls = std::make_shared<SilentCallObserver>();
     platform.restrictions = std::make_shared<UnrestrictedProfile>();
     platform.displayLayout = std::make_shared<UnchangingDisplayLayout>();
@@ -59,9 +62,9 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     platform.analytics = std::make_shared<UngatheredAnalytics>();
     platform.bulletins = std::make_shared<InvisibleBulletins>();
     platform.alerts = std::make_shared<ShelllessAlerts>();
-    platform.ipc = std::make_shared<UnreachableTransport>();
     platform.media =
         std::make_shared<LoadedMediaService>(platform.fileSystem, LoadedMediaService::usualFolders());
+    platform.ipc = std::make_shared<SocketTransport>(root, platform.bundles);
     return platform;
 }
 

@@ -3,6 +3,7 @@
 #include "base/Clock.h"
 #include "base/MainQueue.h"
 #include "platform/AnalyticsSink.h"
+#include "platform/AudioService.h"
 #include "platform/BulletinService.h"
 #include "platform/Bundles.h"
 #include "platform/CallObserver.h"
@@ -40,6 +41,7 @@ struct Platform {
     std::shared_ptr<DeviceProperties> device;
     std::shared_ptr<NotificationCenter> notifications;
     std::shared_ptr<StoragePurgeService> storagePurge;
+    std::shared_ptr<AudioService> audio;
     std::shared_ptr<CallObserver> calls;
     std::shared_ptr<RestrictionsProfile> restrictions;
     std::shared_ptr<DisplayLayoutService> displayLayout;

@@ -70,23 +70,23 @@ class KVRecordingSession : public RecordingSession,
     Size windowSize() const { return windowSize_.copy(); }
     Size originalWindowSize() const { return originalWindowSize_.copy(); }
     void setWindowSize(const Size& size);
-    bool microphoneEnabled() const { return microphoneEnabled_; }
+    bool microphoneEnabled() const override { return microphoneEnabled_; }
     /// Switches the microphone, also while recording. Off means silence, the tap goes on.
-    void setMicrophoneEnabled(bool enabled);
-    bool microphoneEnabledPersistent() const { return microphoneEnabledPersistent_; }
-    void setMicrophoneEnabledPersistent(bool enabled) { microphoneEnabledPersistent_ = enabled; }
+    void setMicrophoneEnabled(bool enabled) override;
+    bool microphoneEnabledPersistent() const override { return microphoneEnabledPersistent_; }
+    void setMicrophoneEnabledPersistent(bool enabled) override { microphoneEnabledPersistent_ = enabled; }
     void setSystemRecording(bool systemRecording) { systemRecording_ = systemRecording; }
     bool isCapturing() const { return captureRecording_; }
     void setCaptureRecording(bool captureRecording) { captureRecording_ = captureRecording; }
     void setBroadcasting(bool broadcasting) { isBroadcasting_ = broadcasting; }
-    bool hasUserConsentForCamera() const { return hasUserConsentForCamera_; }
-    void setHasUserConsentForCamera(bool consent) { hasUserConsentForCamera_ = consent; }
-    bool hasUserConsentForMicrophone() const { return hasUserConsentForMicrophone_; }
-    void setHasUserConsentForMicrophone(bool consent) { hasUserConsentForMicrophone_ = consent; }
+    bool hasUserConsentForCamera() const override { return hasUserConsentForCamera_; }
+    void setHasUserConsentForCamera(bool consent) override { hasUserConsentForCamera_ = consent; }
+    bool hasUserConsentForMicrophone() const override { return hasUserConsentForMicrophone_; }
+    void setHasUserConsentForMicrophone(bool consent) override { hasUserConsentForMicrophone_ = consent; }
     /// An in-app session taps the microphone only with the daemon's own consent.
     bool daemonUserConsentForMicrophone() const { return daemonUserConsentForMicrophone_; }
     void setDaemonUserConsentForMicrophone(bool consent) { daemonUserConsentForMicrophone_ = consent; }
-    void setClientProxy(ClientProxyRef proxy) { clientProxy_.set(std::move(proxy)); }
+    void setClientProxy(ClientProxyRef proxy) override { clientProxy_.set(std::move(proxy)); }
     void setDelegate(std::weak_ptr<KVRecordingSessionDelegate> delegate) {
         delegate_.set(std::move(delegate));
     }
@@ -115,7 +115,7 @@ class KVRecordingSession : public RecordingSession,
     std::optional<URL> interruptedMovieURL() const { return interruptedMovieURL_.copy(); }
 
     // State.
-    bool isPaused() const { return paused_; }
+    bool isPaused() const override { return paused_; }
     bool haveMicTap() const { return haveMicTap_; }
     bool sessionWasResumed() const;
     MediaTime firstSampleTimestamp() const;
@@ -141,7 +141,7 @@ class KVRecordingSession : public RecordingSession,
     // Life cycle.
     /// Begins a recording. `completion`, which may be none, runs when capturing has begun.
     void startSessionWithHandler(CompletionHandler completion);
-    void pauseSession();
+    void pauseSession() override;
     /// Goes on with a window of the client's. Nothing unless paused. The time of the pause is cut out.
     void resumeSessionWithContextID(std::uint32_t contextID);
     /// Stops a running recording; with `notify` the delegate hears of it.

@@ -23,6 +23,19 @@ class RecordingSession {
     virtual bool isSystemRecording() const = 0;
     /// None until a client has connected.
     virtual ClientProxyRef clientProxy() const = 0;
+    virtual void setClientProxy(ClientProxyRef proxy) = 0;
+
+    virtual bool isPaused() const = 0;
+    virtual bool microphoneEnabled() const = 0;
+    virtual void setMicrophoneEnabled(bool enabled) = 0;
+    virtual bool microphoneEnabledPersistent() const = 0;
+    virtual void setMicrophoneEnabledPersistent(bool enabled) = 0;
+    virtual bool hasUserConsentForCamera() const = 0;
+    virtual void setHasUserConsentForCamera(bool consent) = 0;
+    virtual bool hasUserConsentForMicrophone() const = 0;
+    virtual void setHasUserConsentForMicrophone(bool consent) = 0;
+    /// Pauses a recording that runs.
+    virtual void pauseSession() = 0;
 
     virtual void setRecording(bool recording) = 0;
     virtual void setPaused(bool paused) = 0;

@@ -24,7 +24,22 @@ class FakeRecordingSession : public RecordingSession {
     bool isRecording() const override { return recording; }
     bool isBroadcasting() const override { return broadcasting; }
     bool isSystemRecording() const override { return systemRecording; }
-    ClientProxyRef clientProxy() const override { return client; }
+    ClientProxyRef clientProxy() const override { return connectedClient ? connectedClient : client; }
+    void setClientProxy(ClientProxyRef proxy) override { connectedClient = std::move(proxy); }
+
+    bool isPaused() const override { return paused; }
+    bool microphoneEnabled() const override { return microphone; }
+    void setMicrophoneEnabled(bool enabled) override { microphone = enabled; }
+    bool microphoneEnabledPersistent() const override { return microphonePersistent; }
+    void setMicrophoneEnabledPersistent(bool enabled) override { microphonePersistent = enabled; }
+    bool hasUserConsentForCamera() const override { return cameraConsent; }
+    void setHasUserConsentForCamera(bool consent) override { cameraConsent = consent; }
+    bool hasUserConsentForMicrophone() const override { return microphoneConsent; }
+    void setHasUserConsentForMicrophone(bool consent) override { microphoneConsent = consent; }
+    void pauseSession() override {
+        note("pauseSession");
+        paused = true;
+    }
 
     void setRecording(bool isRecording) override { recording = isRecording; }
     void setPaused(bool isPaused) override { paused = isPaused; }
@@ -64,6 +79,12 @@ class FakeRecordingSession : public RecordingSession {
     bool broadcasting = false;
     bool systemRecording = false;
     bool paused = false;
+    bool microphone = false;
+    bool microphonePersistent = false;
+    bool cameraConsent = false;
+    bool microphoneConsent = false;
+    /// What `setClientProxy` stored; until then the client is `client`.
+    ClientProxyRef connectedClient;
     std::shared_ptr<FakeClientProxy> client = std::make_shared<FakeClientProxy>();
     std::optional<Dictionary> extensionInfo;
     std::optional<URL> interruptedMovieURL;

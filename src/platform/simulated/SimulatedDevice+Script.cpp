@@ -54,11 +54,26 @@ bool setFreeSpace(SimulatedDevice& device, const Words& arguments) {
     return bytes.has_value();
 }
 
-bool advance(SimulatedDevice& device, const Words& arguments) {
+/// The one argument as an interval of at most `longest` seconds.
+std::optional<std::chrono::nanoseconds> intervalFrom(const Words& arguments, double longest) {
     const auto seconds = arguments.size() == 1 ? numberFrom<double>(arguments[0]) : std::nullopt;
+    if (!seconds || !(*seconds >= 0 && *seconds <= longest)) return std::nullopt;
+    return std::chrono::nanoseconds(std::llround(*seconds * 1e9));
+}
+
+bool advance(SimulatedDevice& device, const Words& arguments) {
     constexpr double kLongest = 1e9;  // some thirty years, well inside what nanoseconds can count
-    if (!seconds || !(*seconds >= 0 && *seconds <= kLongest)) return false;
-    device.advance(std::chrono::nanoseconds(std::llround(*seconds * 1e9)));
+    const auto interval = intervalFrom(arguments, kLongest);
+    if (interval) device.advance(*interval);
+    return interval.has_value();
+}
+
+bool sound(SimulatedDevice& device, const Words& arguments) {
+    constexpr double kLongest = 60;  // all of it is in memory at once
+    const auto interval = intervalFrom(arguments, kLongest);
+    if (!interval) return false;
+    device.advance(*interval);
+    device.audio->play(*interval);
     return true;
 }
 
@@ -103,6 +118,9 @@ const std::map<std::string, Command>& commands() {
         {"answer", answer},
         {"fail", failNext},
         {"purge", purge},
+        {"take-microphone", simple(&SimulatedDevice::takeMicrophone)},
+        {"give-microphone-back", simple(&SimulatedDevice::giveMicrophoneBack)},
+        {"sound", sound},
     };
     return kCommands;
 }

@@ -17,6 +17,7 @@ SimulatedDevice::SimulatedDevice()
       device(std::make_shared<SimulatedDeviceProperties>()),
       notifications(std::make_shared<SimulatedNotifications>()),
       storagePurge(std::make_shared<SimulatedStoragePurge>()),
+      audio(std::make_shared<SimulatedAudio>(clock, faults)),
       calls(std::make_shared<SimulatedCallObserver>(mainQueue)),
       restrictions(std::make_shared<SimulatedRestrictions>()),
       displayLayout(std::make_shared<SimulatedDisplayLayout>()),
@@ -41,6 +42,7 @@ Platform SimulatedDevice::platform() const {
     platform.device = device;
     platform.notifications = notifications;
     platform.storagePurge = storagePurge;
+    platform.audio = audio;
     platform.calls = calls;
     platform.restrictions = restrictions;
     platform.displayLayout = displayLayout;
@@ -58,7 +60,7 @@ Platform SimulatedDevice::platform() const {
 void SimulatedDevice::settle() {
     do {
         GlobalQueue::drain();
-    } while (mainQueue->runUntilIdle() > 0);
+    } while (mainQueue->runUntilIdle() > 0 || ipc->settle());
 }
 
 void SimulatedDevice::advance(std::chrono::nanoseconds interval) {

@@ -2,6 +2,7 @@
 
 #include "platform/Platform.h"
 #include "platform/simulated/SimulatedAnalytics.h"
+#include "platform/simulated/SimulatedAudio.h"
 #include "platform/simulated/SimulatedBundles.h"
 #include "platform/simulated/SimulatedClock.h"
 #include "platform/simulated/SimulatedEnvironment.h"
@@ -43,7 +44,7 @@ class SimulatedDevice {
     /// The services to hand to the logic.
     Platform platform() const;
 
-    /// Runs main-queue tasks, due timers and global-queue work until none is left.
+    /// Runs main-queue tasks, due timers, global-queue work and messages until none is left.
     void settle();
     /// Moves the clock, lets the screen deliver what that made due, and settles.
     void advance(std::chrono::nanoseconds interval);
@@ -62,6 +63,9 @@ class SimulatedDevice {
     /// The display shows one element for each level.
     void setLayout(const std::vector<int>& levels);
     void setFreeSpace(std::uint64_t bytes) { fileSystem->setFreeSpace(bytes); }
+    /// The microphone is taken away, or comes back.
+    void takeMicrophone() { audio->interrupt(); }
+    void giveMicrophoneBack() { audio->endInterruption(); }
     void answerAlert(SystemAlertResponse response) { alerts->answer(response); }
 
     /// The next call of "Service.operation" (the names that the twins use, as in "FileSystem.removeItem")
@@ -72,8 +76,9 @@ class SimulatedDevice {
 
     /// One line of a script: "lock", "unlock", "ring", "dial", "hang-up", "forbid-recording",
     /// "allow-recording", "layout LEVEL...", "free-space BYTES", "advance SECONDS", "answer
-    /// default|alternate|other|cancelled", "fail OPERATION ERRNO", "purge URGENCY" or "settle". Fails, having
-    /// done nothing, on anything else.
+    /// default|alternate|other|cancelled", "fail OPERATION ERRNO", "purge URGENCY", "take-microphone",
+    /// "give-microphone-back", "sound SECONDS" (advances the clock; what is heard meanwhile is captured) or
+    /// "settle". Fails, having done nothing, on anything else.
     OptionalError perform(std::string_view line);
 
     const std::shared_ptr<SimulatedFaults> faults;
@@ -88,6 +93,7 @@ class SimulatedDevice {
     const std::shared_ptr<SimulatedDeviceProperties> device;
     const std::shared_ptr<SimulatedNotifications> notifications;
     const std::shared_ptr<SimulatedStoragePurge> storagePurge;
+    const std::shared_ptr<SimulatedAudio> audio;
     const std::shared_ptr<SimulatedCallObserver> calls;
     const std::shared_ptr<SimulatedRestrictions> restrictions;
     const std::shared_ptr<SimulatedDisplayLayout> displayLayout;

@@ -75,12 +75,5 @@ TEST_F(ManagerClientTest, RememberedConnectionThatWentAwayReadsAsNone) {
     EXPECT_EQ(manager->connectionManager()->getCurrentConnection(), nullptr);
 }
 
-TEST_F(ManagerClientTest, EveryPeerIsTurnedAwayWhileNoProtocolIsSpoken) {
-    SimulatedListener listener("com.quillon.kelvod");
-    const auto peer = std::make_shared<SimulatedConnection>(10, Dictionary());
-    EXPECT_FALSE(manager->connectionManager()->listenerShouldAcceptNewConnection(listener, peer));
-    EXPECT_TRUE(log.contains("KVConnectionManager: turned away PID 10: no protocol is spoken yet"));
-}
-
 }  // namespace
 }  // namespace kelvo

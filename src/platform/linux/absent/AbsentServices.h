@@ -4,7 +4,6 @@
 #include "platform/BulletinService.h"
 #include "platform/CallObserver.h"
 #include "platform/DisplayLayout.h"
-#include "platform/IPC.h"
 #include "platform/RestrictionsProfile.h"
 #include "platform/SystemAlert.h"
 
@@ -76,22 +75,6 @@ class ShelllessAlerts : public SystemAlertService {
     Result<std::shared_ptr<SystemAlert>> createAlert(const SystemAlertContent&) override {
         return KVError::posix(ENOSYS, "no system shell shows alerts");
     }
-};
-
-/// A transport that no client can reach.
-class UnreachableTransport : public IPCTransport {
-  public:
-    std::shared_ptr<IPCListener> createListener(std::string_view) override {
-        return std::make_shared<Listener>();
-    }
-    std::shared_ptr<IPCConnection> currentConnection() override { return nullptr; }
-
-  private:
-    class Listener : public IPCListener {
-      public:
-        void setDelegate(std::weak_ptr<IPCListenerDelegate>) override {}
-        void resume() override {}
-    };
 };
 
 }  // namespace kelvo

@@ -175,6 +175,32 @@ TEST_F(SimulatedDeviceTest, ScriptSetsTheFreeSpace) {
     EXPECT_EQ(*device.fileSystem->freeSpace("/"), 123U);
 }
 
+TEST_F(SimulatedDeviceTest, ScriptTakesTheMicrophoneAndGivesItBack) {
+    std::vector<std::uint64_t> types;
+    device.audio->session->setInterruptionHandler([&](std::uint64_t type) { types.push_back(type); });
+    EXPECT_EQ(perform("take-microphone"), std::nullopt);
+    EXPECT_EQ(perform("give-microphone-back"), std::nullopt);
+    EXPECT_EQ(types, (std::vector<std::uint64_t>{kAudioInterruptionBegan, kAudioInterruptionEnded}));
+}
+
+TEST_F(SimulatedDeviceTest, ScriptLetsSoundBeHeard) {
+    Bytes heard;
+    const auto queue = *device.audio->createInputQueue(
+        AudioFormatRecord::signed16(44100, 1),
+        [&](const AudioQueueBufferRef& buffer, const AudioTimeStamp& start, std::uint32_t, auto) {
+            EXPECT_EQ(start.hostTime, 0U);
+            heard.assign(buffer->bytes.begin(),
+                         buffer->bytes.begin() + static_cast<std::ptrdiff_t>(buffer->byteSize));
+        },
+        kAudioQueueTapsProcess);
+    ASSERT_FALSE(queue->setTapProcess(7));
+    ASSERT_FALSE(queue->enqueueBuffer(*queue->allocateBuffer(8820)));
+    ASSERT_FALSE(queue->start());
+    EXPECT_EQ(perform("sound 0.05"), std::nullopt);
+    EXPECT_EQ(heard.size(), 4410U);
+    EXPECT_EQ(device.clock->monotonicNow(), 50ms);
+}
+
 TEST_F(SimulatedDeviceTest, ScriptMovesTheClock) {
     EXPECT_EQ(perform("advance 1.5"), std::nullopt);
     EXPECT_EQ(device.clock->monotonicNow(), 1500ms);
@@ -230,8 +256,8 @@ INSTANTIATE_TEST_SUITE_P(Lines, BadScriptLineTest,
                                          "advance -1", "advance nan", "advance inf", "advance 1e10",
                                          "advance 1s", "answer", "answer maybe", "answer default other",
                                          "fail", "fail FileSystem.removeItem", "fail FileSystem.removeItem x",
-                                         "purge", "purge much", "settle now", "forbid-recording 1",
-                                         "allow-recording 1", "hang-up 1", "dial 1"));
+                                         "purge", "purge much", "sound", "sound 61", "sound x", "settle now",
+                                         "forbid-recording 1", "allow-recording 1", "hang-up 1", "dial 1"));
 
 }  // namespace
 }  // namespace kelvo

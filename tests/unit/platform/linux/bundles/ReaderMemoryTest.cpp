@@ -16,8 +16,9 @@ std::atomic<std::size_t> mostLiveBytes{0};
 
 }  // namespace
 
-// Counts what is allocated while it is allocated.
-void* operator new(std::size_t size) {
+// Counts what is allocated while it is allocated. Not inlined, or an optimising compiler sees `malloc` on one side and
+// `delete` on the other and calls them mismatched.
+[[gnu::noinline]] void* operator new(std::size_t size) {
     void* block = std::malloc(size);
     if (block == nullptr) std::abort();
     const std::size_t live = liveBytes += ::malloc_usable_size(block);
@@ -27,12 +28,12 @@ void* operator new(std::size_t size) {
     return block;
 }
 
-void operator delete(void* block) noexcept {
+[[gnu::noinline]] void operator delete(void* block) noexcept {
     if (block != nullptr) liveBytes -= ::malloc_usable_size(block);
     std::free(block);
 }
 
-void operator delete(void* block, std::size_t) noexcept {
+[[gnu::noinline]] void operator delete(void* block, std::size_t) noexcept {
     operator delete(block);
 }
 

@@ -1,0 +1,148 @@
+#include "base/KVLog.h"
+#include "daemon/KVRecordingManager.h"
+#include "ipc/KVClientProxyFactory.h"
+
+namespace kelvo {
+namespace {
+
+void logNotOffered(const char* request) {
+    KVLogError("KVRecordingManager: %s is not offered yet", request);
+}
+
+}  // namespace
+
+void KVRecordingManager::startRecordingWindowLayerContextIDs(const std::vector<std::uint32_t>&, const Size&,
+                                                             bool, bool, bool, bool, bool,
+                                                             const std::shared_ptr<IPCEndpoint>&,
+                                                             StartHandler handler) {
+    logNotOffered("startRecordingWindowLayerContextIDs");
+    if (handler) handler(errors_->kvUserErrorForCode(kRecordingErrorFailedToStart), false, false);
+}
+
+void KVRecordingManager::setupBroadcastWithHostBundleID(const std::string&, const std::string&, const Bytes&,
+                                                        const Dictionary&, ErrorHandler handler) {
+    logNotOffered("setupBroadcastWithHostBundleID");
+    if (handler) handler(errors_->kvUserErrorForCode(kRecordingErrorUnknown));
+}
+
+void KVRecordingManager::getCurrentBroadcastImages(ImagesHandler handler) {
+    if (handler) handler(currentHostAppImage_.copy(), currentExtensionAppImage_.copy());
+}
+
+void KVRecordingManager::getSystemBroadcastExtensionInfo(ExtensionsHandler handler) {
+    logNotOffered("getSystemBroadcastExtensionInfo");
+    if (handler) handler({}, errors_->kvUserErrorForCode(kRecordingErrorUnknown));
+}
+
+void KVRecordingManager::stopRecordingWithHandler(MovieHandler handler) {
+    KVLog("KVRecordingManager: stopRecordingWithHandler:");
+    stopRecordingWithStartClipDuration(0, 0, std::move(handler));
+}
+
+/// The text keeps older words of the request; readers of logs know it so.
+void KVRecordingManager::stopRecordingWithStartClipDuration(double startClipDuration, double endClipDuration,
+                                                            MovieHandler handler) {
+    KVLog("KVRecordingManager: stopRecordingWithStartTimeOffset:endTimeOffset:handler:");
+    sessionManager_->stopRecordingSession(getCallingConnectionRecordingSession(), startClipDuration,
+                                          endClipDuration, std::move(handler));
+}
+
+void KVRecordingManager::saveVideoToCameraRoll(const URL& movieURL, ErrorHandler handler) {
+    saveVideoToCameraRoll(std::optional(movieURL), std::move(handler));
+}
+
+void KVRecordingManager::pauseRecording() {
+    KVLog("KVRecordingManager:pauseRecording");
+    const SessionRef session = getCallingConnectionRecordingSession();
+    if (!session || session->isSystemRecording() || !session->isRecording() || session->isPaused()) return;
+    session->pauseSession();
+}
+
+void KVRecordingManager::resumeRecordingWithWindowLayerContextID(std::uint32_t) {
+    logNotOffered("resumeRecordingWithWindowLayerContextID");
+}
+
+void KVRecordingManager::setMicrophoneEnabled(bool enabled) {
+    KVLog("KVRecordingManager: setMicrophoneEnabled:%i", enabled ? 1 : 0);
+    const SessionRef session = getCallingConnectionRecordingSession();
+    if (!session || !session->isRecording()) return;
+    session->setMicrophoneEnabled(enabled);
+    if (const ClientProxyRef client = session->clientProxy()) client->updateScreenRecordingState();
+}
+
+void KVRecordingManager::updateProcessIDForAudioCaptureWithPID(std::int32_t) {
+    logNotOffered("updateProcessIDForAudioCaptureWithPID");
+}
+
+void KVRecordingManager::discardRecordingWithHandler(DoneHandler handler) {
+    KVLog("KVRecordingManager: discardRecording");
+    const SessionRef session = getCallingConnectionRecordingSession();
+    if (!session) return;
+    if (session->isRecording()) {
+        KVLogError("can't discard recording while recording is in progress");
+        return;
+    }
+    session->finishAndCleanupSessionFilesWithHandler(std::move(handler));
+}
+
+void KVRecordingManager::synchronousGetCurrentState(StateHandler handler) {
+    if (!handler) return;
+    const SessionRef session = getCallingConnectionRecordingSession();
+    if (!session) return handler(std::nullopt);
+    handler(Dictionary{
+        {"isRecording", session->isRecording()},
+        {"isBroadcasting", session->isBroadcasting()},
+        {"microphoneEnabled", session->microphoneEnabled()},
+        {"isSystemRecording", session->isSystemRecording()},
+        {"hasUserConsentForMicrophone", session->hasUserConsentForMicrophone()},
+        {"hasUserConsentForCamera", session->hasUserConsentForCamera()},
+        {"microphoneEnabledPersistent", session->microphoneEnabledPersistent()},
+    });
+}
+
+/// No session is linked to an extension yet, so none can be the preferred one's.
+void KVRecordingManager::synchronousIsBroadcastingWithPreferredExtension(const std::string&,
+                                                                         BooleanHandler handler) {
+    if (handler) handler(false);
+}
+
+void KVRecordingManager::setHasUserConsentForCamera(bool consent) {
+    if (const SessionRef session = getCallingConnectionRecordingSession())
+        session->setHasUserConsentForCamera(consent);
+}
+
+void KVRecordingManager::setHasUserConsentForMicrophone(bool consent) {
+    if (const SessionRef session = getCallingConnectionRecordingSession())
+        session->setHasUserConsentForMicrophone(consent);
+}
+
+void KVRecordingManager::setBroadcastURL(const URL&) {
+    logNotOffered("setBroadcastURL");
+}
+
+void KVRecordingManager::setMicrophoneEnabledPersistent(bool enabled) {
+    const SessionRef session = getCallingConnectionRecordingSession();
+    if (!session) return;
+    session->setMicrophoneEnabledPersistent(enabled);
+    if (const ClientProxyRef client = session->clientProxy()) client->updateScreenRecordingState();
+}
+
+void KVRecordingManager::reportCameraUsage(std::int32_t) {
+    logNotOffered("reportCameraUsage");
+}
+
+void KVRecordingManager::connectionManagerDidAcceptNewConnection(
+    const IPCConnectionRef& connection, const std::optional<std::string>& bundleIdentifier) {
+    const SessionRef session =
+        sessionManager_->recordingSessionInstanceWithBundleIdentifier(bundleIdentifier.value_or(""));
+    // A proxy that nobody holds would end the connection of a peer that is welcome.
+    if (session) session->setClientProxy(KVClientProxyFactory::clientProxyWithNewConnection(connection));
+}
+
+void KVRecordingManager::applicationDisconnectedWithBundleID(
+    const std::optional<std::string>& bundleIdentifier, std::int32_t processIdentifier) {
+    KVLog("KVRecordingManager: applicationDisconnected");
+    sessionManager_->applicationDisconnectedWithBundleID(bundleIdentifier.value_or(""), processIdentifier);
+}
+
+}  // namespace kelvo

@@ -1,0 +1,21 @@
+#pragma once
+
+#include "ipc/KVArchive.h"
+#include "ipc/KVBroadcastConfiguration.h"
+
+#include <string_view>
+
+namespace kelvo {
+
+/// How broadcast settings are archived. Caller's thread.
+struct KVBroadcastConfigurationCoding {
+    static constexpr std::string_view kClassName = "KVBroadcastConfiguration";
+    static constexpr bool supportsSecureCoding = true;
+
+    /// The clip's length always; compression properties only when there are any.
+    static void encodeWithCoder(const KVBroadcastConfiguration& configuration, KVCoder& coder);
+    /// A length that is missing or no number is 0; properties that are missing or no dictionary are none.
+    static KVBroadcastConfiguration initWithCoder(const KVCoder& coder);
+};
+
+}  // namespace kelvo

@@ -1,0 +1,188 @@
+#include "platform/ConnectionBase.h"
+
+#include "base/KVLog.h"
+
+#include <cerrno>
+#include <utility>
+
+namespace kelvo {
+namespace {
+
+thread_local IPCConnectionRef connectionServed;
+
+/// Names the connection that is served for as long as this object lives.
+class Serving {
+  public:
+    explicit Serving(IPCConnectionRef connection) { connectionServed = std::move(connection); }
+    ~Serving() { connectionServed.reset(); }
+    Serving(const Serving&) = delete;
+    Serving& operator=(const Serving&) = delete;
+};
+
+KVError connectionOver() {
+    return KVError::posix(ENOTCONN, "connection");
+}
+
+}  // namespace
+
+/// Holds its connection: whoever may still send keeps it alive.
+class ConnectionBase::Remote : public IPCRemoteObject {
+  public:
+    Remote(std::shared_ptr<ConnectionBase> connection, std::function<void(const KVError&)> errorHandler)
+        : connection_(std::move(connection)), errorHandler_(std::move(errorHandler)) {}
+
+    void send(std::size_t method, Array arguments, IPCReply replyHandler) override {
+        connection_->send(method, arguments, std::move(replyHandler), errorHandler_);
+    }
+
+  private:
+    const std::shared_ptr<ConnectionBase> connection_;
+    const std::function<void(const KVError&)> errorHandler_;
+};
+
+IPCConnectionRef ConnectionBase::current() {
+    return connectionServed;
+}
+
+void ConnectionBase::setExported(std::shared_ptr<const IPCInterface> interface,
+                                 std::shared_ptr<IPCExportedObject> object) {
+    exported_.set({std::move(interface), std::move(object)});
+}
+
+void ConnectionBase::setRemoteInterface(std::shared_ptr<const IPCInterface> interface) {
+    remoteInterface_.set(std::move(interface));
+}
+
+std::shared_ptr<const IPCInterface> ConnectionBase::exportedInterface() const {
+    return exported_.with([](const Exported& exported) { return exported.interface; });
+}
+
+void ConnectionBase::setInterruptionHandler(std::function<void()> handler) {
+    handlers_.with([&](Handlers& handlers) { handlers.interruption.swap(handler); });
+}
+
+void ConnectionBase::setInvalidationHandler(std::function<void()> handler) {
+    handlers_.with([&](Handlers& handlers) { handlers.invalidation.swap(handler); });
+}
+
+std::shared_ptr<IPCRemoteObject> ConnectionBase::remoteObjectProxyWithErrorHandler(
+    std::function<void(const KVError&)> errorHandler) {
+    return std::make_shared<Remote>(shared_from_this(), std::move(errorHandler));
+}
+
+void ConnectionBase::resume() {
+    openGate();
+    didResume();
+}
+
+void ConnectionBase::openGate() {
+    // Under the lock, so that nothing overtakes what was held back.
+    gate_.with([this](Gate& gate) {
+        gate.isOpen = true;
+        for (Task& task : std::exchange(gate.held, {}))
+            queue_.async(std::move(task));
+    });
+}
+
+void ConnectionBase::enqueue(Task task) {
+    gate_.with([&](Gate& gate) {
+        if (gate.isOpen) {
+            queue_.async(std::move(task));
+        } else {
+            gate.held.push_back(std::move(task));
+        }
+    });
+}
+
+void ConnectionBase::received(std::size_t method, Array arguments, IPCReply reply) {
+    ++waitingMessages_;
+    enqueue([self = shared_from_this(), method, arguments = std::move(arguments), reply = std::move(reply)] {
+        self->serve(method, arguments, reply);
+        --self->waitingMessages_;
+        self->didServe();
+    });
+}
+
+/// What a lost peer sent before it went still counts; after an invalidation nothing is served.
+void ConnectionBase::serve(std::size_t method, const Array& arguments, const IPCReply& reply) {
+    if (state_ == State::over) return;
+    const Exported exported = exported_.copy();
+    if (!exported.object) return;
+    const Serving serving(shared_from_this());
+    if (exported.object->serve(method, arguments, reply)) return;
+    cutOff("arguments of " + exported.interface->methods[method].name + " are not what it takes");
+}
+
+void ConnectionBase::receivedReply(ReplyIdentifier identifier, Array values) {
+    enqueue([self = shared_from_this(), identifier, values = std::move(values)]() mutable {
+        if (const AwaitedReply awaited = self->takeAwaited(identifier); awaited.handler)
+            awaited.handler(std::move(values));
+    });
+}
+
+void ConnectionBase::receivedError(ReplyIdentifier identifier, const KVError& error) {
+    enqueue([self = shared_from_this(), identifier, error] {
+        if (const AwaitedReply awaited = self->takeAwaited(identifier); awaited.errorHandler)
+            awaited.errorHandler(error);
+    });
+}
+
+ConnectionBase::AwaitedReply ConnectionBase::takeAwaited(ReplyIdentifier identifier) {
+    return awaitedReplies_.with([&](auto& replies) {
+        const auto found = replies.extract(identifier);
+        return found ? std::move(found.mapped()) : AwaitedReply();
+    });
+}
+
+void ConnectionBase::send(std::size_t method, const Array& arguments, IPCReply replyHandler,
+                          const std::function<void(const KVError&)>& errorHandler) {
+    const OptionalError error = trySend(method, arguments, {std::move(replyHandler), errorHandler});
+    if (error && errorHandler) errorHandler(*error);
+}
+
+OptionalError ConnectionBase::trySend(std::size_t method, const Array& arguments, AwaitedReply awaited) {
+    const auto interface = remoteInterface_.copy();
+    if (!interface || method >= interface->methods.size()) return KVError::posix(EINVAL, "remote interface");
+    const IPCMethod& description = interface->methods[method];
+    ReplyIdentifier identifier = 0;
+    if (!description.isOneWay() && awaited.handler) {
+        do {
+            identifier = ++lastIdentifier_;
+        } while (identifier == 0);
+        awaitedReplies_.with([&](auto& replies) { replies.emplace(identifier, std::move(awaited)); });
+    }
+    OptionalError error = isOver() ? connectionOver() : transmit(method, description, arguments, identifier);
+    if (identifier == 0) return error;
+    if (!error && !isOver()) return std::nullopt;
+    // The connection may have ended meanwhile and reported this reply: whoever takes it reports.
+    if (!takeAwaited(identifier).handler) return std::nullopt;
+    return error ? error : connectionOver();
+}
+
+void ConnectionBase::cutOff(const std::string& reason) {
+    if (isOver()) return;
+    KVLogError("IPC: cut off PID %d: %s", processIdentifier(), reason.c_str());
+    end(State::over);
+}
+
+void ConnectionBase::end(State state) {
+    State expected = State::open;
+    if (!state_.compare_exchange_strong(expected, state)) return;
+    const auto self = shared_from_this();
+    enqueue([self, state] { self->runHandlers(state); });
+    openGate();
+    close();
+}
+
+void ConnectionBase::runHandlers(State state) {
+    const Handlers handlers = handlers_.exchange({});
+    if (state == State::lost && handlers.interruption) handlers.interruption();
+    state_ = State::over;
+    if (handlers.invalidation) handlers.invalidation();
+    exported_.set({});
+    for (const auto& [identifier, awaited] : awaitedReplies_.exchange({})) {
+        if (awaited.errorHandler) awaited.errorHandler(connectionOver());
+    }
+}
+
+}  // namespace kelvo

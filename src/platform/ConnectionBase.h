@@ -1,0 +1,113 @@
+#pragma once
+
+#include "base/Guarded.h"
+#include "base/SerialQueue.h"
+#include "platform/IPC.h"
+
+#include <atomic>
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace kelvo {
+
+/// What the connections of every transport have in common: the queue, the handlers, the order of a
+/// connection's end and the replies that are waited for. A transport derives from it, hands in what arrives
+/// and carries what is sent. Thread-safe.
+class ConnectionBase : public IPCConnection, public std::enable_shared_from_this<ConnectionBase> {
+  public:
+    void setExported(std::shared_ptr<const IPCInterface> interface,
+                     std::shared_ptr<IPCExportedObject> object) override;
+    void setRemoteInterface(std::shared_ptr<const IPCInterface> interface) override;
+    void setInterruptionHandler(std::function<void()> handler) override;
+    void setInvalidationHandler(std::function<void()> handler) override;
+    void resume() override;
+    void invalidate() override { end(State::over); }
+    std::shared_ptr<IPCRemoteObject> remoteObjectProxyWithErrorHandler(
+        std::function<void(const KVError&)> errorHandler) override;
+
+    /// The connection whose message the calling thread serves; none outside of that.
+    static IPCConnectionRef current();
+
+    bool isOver() const { return state_ != State::open; }
+    /// Messages that arrived and are not served yet.
+    std::size_t waitingMessages() const { return waitingMessages_; }
+
+    /// Ends the connection because of what the peer did, and logs why in one line.
+    void cutOff(const std::string& reason);
+
+  protected:
+    enum class State : std::uint8_t { open, lost, over };
+    using ReplyIdentifier = std::uint32_t;
+
+    explicit ConnectionBase(const char* queueLabel) : queue_(queueLabel) {}
+
+    /// From the transport: a message of the exported interface arrived. `reply` as `IPCExportedObject` says.
+    void received(std::size_t method, Array arguments, IPCReply reply);
+    /// The reply arrived to what was sent with this identifier; an unknown one is ignored.
+    void receivedReply(ReplyIdentifier identifier, Array values);
+    /// The peer could not serve it.
+    void receivedError(ReplyIdentifier identifier, const KVError& error);
+    /// Ends the connection, once: closes it and queues the handlers.
+    void end(State state);
+
+    std::shared_ptr<const IPCInterface> exportedInterface() const;
+    std::shared_ptr<const IPCInterface> remoteInterface() const { return remoteInterface_.copy(); }
+
+    /// To the transport: send this. A reply is wanted under `identifier` unless it is 0. An error means that
+    /// nothing was sent.
+    virtual OptionalError transmit(std::size_t method, const IPCMethod& description, const Array& arguments,
+                                   ReplyIdentifier identifier) = 0;
+    /// Starts receiving; called once.
+    virtual void didResume() {}
+    /// A message was served: `waitingMessages` fell.
+    virtual void didServe() {}
+    /// The connection has ended: release what it holds of the system. Called once, on any thread.
+    virtual void close() = 0;
+
+    /// What runs on the connection's queue. Held back until the connection is resumed.
+    void enqueue(Task task);
+    SerialQueue& queue() { return queue_; }
+
+  private:
+    class Remote;
+    struct Exported {
+        std::shared_ptr<const IPCInterface> interface;
+        std::shared_ptr<IPCExportedObject> object;
+    };
+    struct Handlers {
+        std::function<void()> interruption;
+        std::function<void()> invalidation;
+    };
+    struct AwaitedReply {
+        IPCReply handler;
+        std::function<void(const KVError&)> errorHandler;
+    };
+    struct Gate {
+        bool isOpen = false;
+        std::vector<Task> held;
+    };
+
+    void send(std::size_t method, const Array& arguments, IPCReply replyHandler,
+              const std::function<void(const KVError&)>& errorHandler);
+    OptionalError trySend(std::size_t method, const Array& arguments, AwaitedReply awaited);
+    AwaitedReply takeAwaited(ReplyIdentifier identifier);
+    void serve(std::size_t method, const Array& arguments, const IPCReply& reply);
+    void openGate();
+    void runHandlers(State state);
+
+    SerialQueue queue_;
+    std::atomic<State> state_{State::open};
+    std::atomic<std::size_t> waitingMessages_{0};
+    std::atomic<ReplyIdentifier> lastIdentifier_{0};
+    Guarded<Exported> exported_;
+    Guarded<std::shared_ptr<const IPCInterface>> remoteInterface_;
+    Guarded<Handlers> handlers_;
+    Guarded<std::map<ReplyIdentifier, AwaitedReply>> awaitedReplies_;
+    Guarded<Gate> gate_;
+};
+
+}  // namespace kelvo

@@ -1,0 +1,59 @@
+#pragma once
+
+#include "base/Result.h"
+#include "base/UniqueFd.h"
+#include "base/Value.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <span>
+#include <string>
+#include <vector>
+
+namespace kelvo::dbus {
+
+enum class MessageType : std::uint8_t { call = 1, reply = 2, error = 3, signal = 4 };
+
+/// One D-Bus message. Little endian on the wire, as all peers of this machine write.
+struct Message {
+    static constexpr std::uint8_t kNoReplyExpected = 1;
+
+    MessageType type = MessageType::call;
+    std::uint8_t flags = 0;
+    std::uint32_t serial = 0;
+    std::uint32_t replySerial = 0;  ///< 0: none
+    std::string path;
+    std::string interface;
+    std::string member;
+    std::string errorName;
+    std::string signature;
+    Bytes body;
+    std::vector<UniqueFd> descriptors;
+
+    bool wantsReply() const { return type == MessageType::call && (flags & kNoReplyExpected) == 0; }
+};
+
+/// Bytes that a message's size can be read from.
+inline constexpr std::size_t kFixedHeader = 16;
+
+/// The bytes of the message whose first `kFixedHeader` bytes these are. Fails when it is no message, or
+/// larger than the bounds.
+Result<std::size_t> messageSize(std::span<const std::byte> head);
+
+/// Exactly one message, without its descriptors; `descriptorCount` says how many it claims. Fails on anything
+/// that is not well-formed.
+Result<Message> parse(std::span<const std::byte> bytes, std::uint32_t& descriptorCount);
+
+/// The bytes that are sent for a message; its descriptors go beside them.
+Bytes serialize(const Message& message);
+
+/// Appends `values`, one for each complete type of `signature`. Fails when one does not fit its type, which
+/// is a bug of the sender. Objects add to `descriptors`: duplicates, so that the object may go.
+OptionalError writeBody(const Array& values, Message& message);
+
+/// The values of a message's body. `objectsAllowed` says whether descriptors may stand in it. Fails on
+/// anything that is not well-formed, and on a descriptor that is not what its type says.
+Result<Array> readBody(Message& message, bool objectsAllowed);
+
+}  // namespace kelvo::dbus

@@ -1,0 +1,17 @@
+#pragma once
+
+#include "platform/IPCInterface.h"
+
+#include <string>
+
+namespace kelvo::dbus {
+
+/// The D-Bus description of one interface, as it stands in an introspection file.
+std::string interfaceXML(const IPCInterface& interface);
+
+/// The answer to `Introspect` on an object that serves `interface` and the standard ones.
+std::string objectXML(const IPCInterface& interface);
+/// The same on an object above ours: the names of its children.
+std::string parentXML(const std::string& child);
+
+}  // namespace kelvo::dbus

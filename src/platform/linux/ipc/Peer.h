@@ -1,0 +1,35 @@
+#pragma once
+
+#include "base/UniqueFd.h"
+#include "platform/Bundles.h"
+
+#include <cstdint>
+#include <memory>
+#include <string_view>
+#include <sys/types.h>
+
+namespace kelvo {
+
+/// The process at the other end of a socket, as the kernel saw it when the socket was connected. Thread-safe.
+class Peer {
+  public:
+    /// Reads the identity now. `bundles` may be none: then the peer holds no rights.
+    Peer(int socket, std::shared_ptr<BundleService> bundles);
+
+    std::int32_t processIdentifier() const { return processIdentifier_; }
+    uid_t user() const { return user_; }
+
+    /// A right of the bundle that the process runs from now; nothing for a process that has ended, whose
+    /// number may be somebody else's by now.
+    Value entitlement(std::string_view name) const;
+
+  private:
+    bool isAlive() const;
+
+    std::int32_t processIdentifier_ = 0;
+    uid_t user_ = static_cast<uid_t>(-1);
+    UniqueFd process_;
+    std::shared_ptr<BundleService> bundles_;
+};
+
+}  // namespace kelvo

@@ -1,0 +1,273 @@
+#include "base/KVLog.h"
+#include "platform/IPCBounds.h"
+#include "platform/linux/ipc/Introspection.h"
+#include "platform/linux/ipc/SocketConnection.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <sys/socket.h>
+
+namespace kelvo {
+namespace {
+
+constexpr const char* kObjectPath = "/com/quillon/kelvod";
+/// The objects above ours, and the one child of each.
+constexpr std::array<std::pair<std::string_view, const char*>, 3> kParents{
+    {{"/", "com"}, {"/com", "quillon"}, {"/com/quillon", "kelvod"}}};
+
+constexpr const char* kUnknownMethod = "org.freedesktop.DBus.Error.UnknownMethod";
+constexpr const char* kUnknownObject = "org.freedesktop.DBus.Error.UnknownObject";
+
+std::string signatureOf(const std::vector<IPCArgument>& arguments) {
+    std::string signature;
+    for (const IPCArgument& argument : arguments)
+        signature += argument.signature;
+    return signature;
+}
+
+bool allowsObjects(const std::vector<IPCArgument>& arguments) {
+    return std::ranges::any_of(
+        arguments, [](const IPCArgument& argument) { return argument.allowedObjects != IPCObjects::none; });
+}
+
+dbus::Message replyMessage(dbus::MessageType type, std::uint32_t serial) {
+    dbus::Message reply;
+    reply.type = type;
+    reply.flags = dbus::Message::kNoReplyExpected;
+    reply.replySerial = serial;
+    return reply;
+}
+
+/// Counts a reply as owed for as long as somebody may still send it.
+class OwedReply {
+  public:
+    explicit OwedReply(std::shared_ptr<std::atomic<std::size_t>> owed) : owed_(std::move(owed)) { ++*owed_; }
+    ~OwedReply() { settle(); }
+    OwedReply(const OwedReply&) = delete;
+    OwedReply& operator=(const OwedReply&) = delete;
+
+    /// True the first time.
+    bool settle() {
+        if (isSettled_.exchange(true)) return false;
+        --*owed_;
+        return true;
+    }
+
+  private:
+    const std::shared_ptr<std::atomic<std::size_t>> owed_;
+    std::atomic<bool> isSettled_{false};
+};
+
+}  // namespace
+
+void SocketConnection::handle(dbus::Message message) {
+    switch (message.type) {
+        case dbus::MessageType::call:
+            return handleCall(std::move(message));
+        case dbus::MessageType::reply:
+        case dbus::MessageType::error:
+            return handleReply(std::move(message));
+        case dbus::MessageType::signal:
+            return;  // allowed, and of no interest
+    }
+}
+
+void SocketConnection::handleCall(dbus::Message message) {
+    const auto interface = exportedInterface();
+    const bool isOurs = interface && message.path == kObjectPath &&
+                        (message.interface.empty() || message.interface == interface->name);
+    const auto method = isOurs ? interface->indexOf(message.member) : std::nullopt;
+    if (!method) return handleStandardCall(message);
+    handleExportedCall(std::move(message), *method, *interface);
+}
+
+void SocketConnection::handleExportedCall(dbus::Message message, std::size_t method,
+                                          const IPCInterface& interface) {
+    const IPCMethod& description = interface.methods[method];
+    if (message.signature != signatureOf(description.arguments))
+        return cutOff("signature of " + description.name + " is not what it takes");
+    auto arguments = dbus::readBody(message, allowsObjects(description.arguments));
+    if (!arguments) return cutOff(description.name + ": " + arguments.error().localizedDescription());
+    IPCReply reply;
+    if (message.wantsReply() && !description.isOneWay()) {
+        if (*owedReplies_ >= ipc_bounds::kMostOwedReplies)
+            return cutOff("more requests than may be outstanding");
+        reply = replyTo(message.serial, description);
+    }
+    received(method, std::move(*arguments), std::move(reply));
+    // A one-way request has nothing to say, but a caller that waits for its end is let go.
+    if (message.wantsReply() && description.isOneWay()) answer(message, "", {});
+}
+
+IPCReply SocketConnection::replyTo(std::uint32_t serial, const IPCMethod& method) {
+    return [weakSelf = std::weak_ptr(std::static_pointer_cast<SocketConnection>(shared_from_this())), serial,
+            name = method.name, signature = signatureOf(*method.reply),
+            owed = std::make_shared<OwedReply>(owedReplies_)](const Array& values) {
+        const auto self = weakSelf.lock();
+        if (!owed->settle() || !self || self->isOver()) return;
+        dbus::Message reply = replyMessage(dbus::MessageType::reply, serial);
+        reply.member = name;
+        reply.signature = signature;
+        if (const OptionalError error = dbus::writeBody(values, reply)) {
+            KVLogError("IPC: reply of %s cannot be sent", name.c_str());
+            reply = replyMessage(dbus::MessageType::error, serial);
+            reply.errorName = "org.freedesktop.DBus.Error.Failed";
+        }
+        reply.member.clear();
+        self->sendMessage(std::move(reply));
+    };
+}
+
+/// What every D-Bus object answers, and what tools ask before they call.
+void SocketConnection::handleStandardCall(const dbus::Message& message) {
+    const auto interface = exportedInterface();
+    const std::string call = message.interface + "." + message.member;
+    if (call == "org.freedesktop.DBus.Hello") return answer(message, "s", {":1.1"});
+    if (call == "org.freedesktop.DBus.Peer.Ping") return answer(message, "", {});
+    if (call == "org.freedesktop.DBus.Properties.GetAll") return answer(message, "a{sv}", {Dictionary()});
+    if (call == "org.freedesktop.DBus.Introspectable.Introspect") {
+        if (message.path == kObjectPath && interface)
+            return answer(message, "s", {dbus::objectXML(*interface)});
+        for (const auto& [path, child] : kParents) {
+            if (message.path == path) return answer(message, "s", {dbus::parentXML(child)});
+        }
+    }
+    if (message.path != kObjectPath) return answerError(message, kUnknownObject, "no object " + message.path);
+    answerError(message, kUnknownMethod, "no method " + call);
+}
+
+void SocketConnection::answer(const dbus::Message& call, const std::string& signature, const Array& values) {
+    if (!call.wantsReply()) return;
+    dbus::Message reply = replyMessage(dbus::MessageType::reply, call.serial);
+    reply.signature = signature;
+    if (!dbus::writeBody(values, reply)) sendMessage(std::move(reply));
+}
+
+void SocketConnection::answerError(const dbus::Message& call, const char* name, const std::string& text) {
+    if (!call.wantsReply()) return;
+    dbus::Message reply = replyMessage(dbus::MessageType::error, call.serial);
+    reply.errorName = name;
+    reply.signature = "s";
+    if (!dbus::writeBody({text}, reply)) sendMessage(std::move(reply));
+}
+
+void SocketConnection::handleReply(dbus::Message message) {
+    const auto interface = remoteInterface();
+    std::pair<ReplyIdentifier, std::size_t> awaited{0, 0};
+    {
+        const std::lock_guard lock(outMutex_);
+        const auto found = out_.awaited.extract(message.replySerial);
+        if (found) awaited = found.mapped();
+    }
+    if (awaited.first == 0 || !interface) return;
+    if (message.type == dbus::MessageType::error)
+        return receivedError(awaited.first, KVError::posix(EPROTO, message.errorName));
+    const std::vector<IPCArgument>& expected = *interface->methods[awaited.second].reply;
+    if (message.signature != signatureOf(expected)) return cutOff("reply of another signature");
+    auto values = dbus::readBody(message, allowsObjects(expected));
+    if (!values) return cutOff("reply: " + values.error().localizedDescription());
+    receivedReply(awaited.first, std::move(*values));
+}
+
+OptionalError SocketConnection::transmit(std::size_t method, const IPCMethod& description,
+                                         const Array& arguments, ReplyIdentifier identifier) {
+    const auto interface = remoteInterface();
+    dbus::Message call;
+    call.flags = identifier == 0 ? dbus::Message::kNoReplyExpected : 0;
+    call.path = kObjectPath;
+    call.interface = interface->name;
+    call.member = description.name;
+    call.signature = signatureOf(description.arguments);
+    if (OptionalError error = dbus::writeBody(arguments, call)) return error;
+    return sendCall(std::move(call), identifier, method);
+}
+
+OptionalError SocketConnection::sendCall(dbus::Message message, ReplyIdentifier identifier,
+                                         std::size_t method) {
+    std::unique_lock lock(outMutex_);
+    message.serial = nextSerial();
+    if (identifier != 0) out_.awaited[message.serial] = {identifier, method};
+    const bool isWithinBounds = push(std::move(message));
+    lock.unlock();
+    afterPush(isWithinBounds);
+    return isOver() ? OptionalError(KVError::posix(ENOTCONN, "connection")) : std::nullopt;
+}
+
+void SocketConnection::sendMessage(dbus::Message message) {
+    std::unique_lock lock(outMutex_);
+    message.serial = nextSerial();
+    const bool isWithinBounds = push(std::move(message));
+    lock.unlock();
+    afterPush(isWithinBounds);
+}
+
+/// 0 is no serial.
+std::uint32_t SocketConnection::nextSerial() {
+    if (++out_.lastSerial == 0) ++out_.lastSerial;
+    return out_.lastSerial;
+}
+
+/// Queues a message. False when that passes a bound; then nothing was queued.
+bool SocketConnection::push(dbus::Message message) {
+    Outgoing outgoing{dbus::serialize(message), 0, std::move(message.descriptors)};
+    if (out_.unsentBytes + outgoing.bytes.size() > ipc_bounds::kMostUnsentBytes ||
+        out_.unsentDescriptors + outgoing.descriptors.size() > ipc_bounds::kMostUnsentDescriptors)
+        return false;
+    out_.unsentBytes += outgoing.bytes.size();
+    out_.unsentDescriptors += outgoing.descriptors.size();
+    out_.queue.push_back(std::move(outgoing));
+    return true;
+}
+
+/// Sends on the caller's thread what the socket takes at once; the loop sees to the rest.
+void SocketConnection::afterPush(bool isWithinBounds) {
+    if (!isWithinBounds) return cutOff("does not read what is sent to it");
+    const Socket held = socket();
+    if (!held) return;
+    switch (flush(held->get())) {
+        case Flushed::all:
+            return;
+        case Flushed::some:
+            return arm();
+        case Flushed::lost:
+            return end(State::lost);
+    }
+}
+
+SocketConnection::Flushed SocketConnection::flush(int socket) {
+    const std::lock_guard lock(outMutex_);
+    if (!maySend()) return Flushed::some;
+    while (!out_.queue.empty()) {
+        Outgoing& next = out_.queue.front();
+        alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int) * ipc_bounds::kMostDescriptors)> control{};
+        iovec part{next.bytes.data() + next.sent, next.bytes.size() - next.sent};
+        msghdr header{};
+        header.msg_iov = &part;
+        header.msg_iovlen = 1;
+        if (!next.descriptors.empty()) {
+            header.msg_control = control.data();
+            header.msg_controllen = CMSG_SPACE(sizeof(int) * next.descriptors.size());
+            cmsghdr* item = CMSG_FIRSTHDR(&header);
+            item->cmsg_level = SOL_SOCKET;
+            item->cmsg_type = SCM_RIGHTS;
+            item->cmsg_len = CMSG_LEN(sizeof(int) * next.descriptors.size());
+            for (std::size_t i = 0; i < next.descriptors.size(); ++i) {
+                const int descriptor = next.descriptors[i].get();
+                std::memcpy(CMSG_DATA(item) + i * sizeof(int), &descriptor, sizeof(descriptor));
+            }
+        }
+        const ssize_t count = ::sendmsg(socket, &header, MSG_NOSIGNAL | MSG_DONTWAIT);
+        if (count < 0 && errno == EINTR) continue;
+        if (count < 0) return errno == EAGAIN ? Flushed::some : Flushed::lost;
+        out_.unsentDescriptors -= next.descriptors.size();
+        next.descriptors.clear();
+        next.sent += static_cast<std::size_t>(count);
+        out_.unsentBytes -= static_cast<std::size_t>(count);
+        if (next.sent == next.bytes.size()) out_.queue.pop_front();
+    }
+    return Flushed::all;
+}
+
+}  // namespace kelvo

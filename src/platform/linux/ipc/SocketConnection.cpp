@@ -1,0 +1,182 @@
+#include "platform/linux/ipc/SocketConnection.h"
+
+#include "base/KVLog.h"
+#include "platform/IPCBounds.h"
+
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <sys/epoll.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+namespace kelvo {
+
+using namespace ipc_bounds;
+
+SocketConnection::SocketConnection(Side side, UniqueFd socket, std::shared_ptr<SocketLoop> loop,
+                                   std::shared_ptr<BundleService> bundles, Task release)
+    : ConnectionBase("com.quillon.kelvod.connection"),
+      side_(side),
+      socket_(std::make_shared<UniqueFd>(std::move(socket))),
+      loop_(std::move(loop)),
+      peer_(socket_.copy()->get(), std::move(bundles)),
+      release_(std::move(release)) {
+    if (side_ == Side::server) {
+        authentication_.emplace(peer_.user());
+        return;
+    }
+    const std::string greeting = dbus::clientGreeting(::getuid());
+    const auto* first = reinterpret_cast<const std::byte*>(greeting.data());
+    out_.queue.push_back({Bytes(first, first + greeting.size()), 0, {}});
+    out_.unsentBytes = greeting.size();
+}
+
+SocketConnection::~SocketConnection() {
+    // Never resumed, or it would still be held.
+    if (const Task release = release_.exchange(nullptr)) release();
+}
+
+void SocketConnection::didResume() {
+    const Socket held = socket();
+    if (!held || token_ != 0) return;
+    token_ = loop_->add(held->get(), std::static_pointer_cast<SocketConnection>(shared_from_this()));
+    arm();
+    if (isOver()) close();  // it ended while it was being added
+}
+
+void SocketConnection::close() {
+    const Socket held = socket_.exchange(nullptr);
+    if (!held) return;
+    if (token_ != 0) loop_->remove(held->get(), token_);
+    ::shutdown(held->get(), SHUT_RDWR);
+    std::deque<Outgoing> unsent;
+    {
+        const std::lock_guard lock(outMutex_);
+        unsent.swap(out_.queue);
+        out_.awaited.clear();
+    }
+    if (const Task release = release_.exchange(nullptr)) release();
+}
+
+bool SocketConnection::isPaused() const {
+    return waitingMessages() >= kMostWaitingMessages;
+}
+
+/// Asks for what this connection can use now: input unless too much waits, output while something is unsent.
+void SocketConnection::arm() {
+    const Socket held = socket();
+    if (!held || token_ == 0) return;
+    // Under the lock, so that the latest look at the queue is also the latest to be armed.
+    const std::lock_guard lock(outMutex_);
+    std::uint32_t events = isPaused() ? 0U : EPOLLIN;
+    if (maySend() && !out_.queue.empty()) events |= EPOLLOUT;
+    if (events != 0) loop_->arm(held->get(), token_, events);
+}
+
+void SocketConnection::didServe() {
+    if (waitingMessages() != kMostWaitingMessages / 2) return;
+    const Socket held = socket();
+    // Output is nearly always possible: so the loop looks at once at what was received but not handled.
+    if (held && token_ != 0) loop_->arm(held->get(), token_, EPOLLIN | EPOLLOUT);
+}
+
+void SocketConnection::ready(std::uint32_t) {
+    const Socket held = socket();
+    if (!held) return;
+    if (flush(held->get()) == Flushed::lost) return end(State::lost);
+    handleReceived();
+    if (!isPaused() && !isOver()) receive(held->get());
+    if (isOver()) return;
+    const bool isUnfinished = !isAuthenticated_ || (!incoming_.empty() && !isPaused());
+    if (!isUnfinished) {
+        deadline_.reset();
+    } else if (!deadline_) {
+        deadline_ = Moment::clock::now() + kPatience;
+        loop_->tickAt(*deadline_);
+    }
+    arm();
+}
+
+std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
+    if (!deadline_ || *deadline_ > now) return deadline_;
+    deadline_.reset();
+    cutOff(isAuthenticated_ ? "message half sent and held" : "no end of authentication");
+    return std::nullopt;
+}
+
+void SocketConnection::receive(int socket) {
+    while (!isPaused() && !isOver() && receiveSome(socket))
+        handleReceived();
+}
+
+/// Takes what is there, within the size of one message. False when nothing is, or the connection ended.
+bool SocketConnection::receiveSome(int socket) {
+    std::array<std::byte, 16384> buffer;
+    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int) * kMostDescriptors)> control;
+    iovec part{buffer.data(), buffer.size()};
+    msghdr header{};
+    header.msg_iov = &part;
+    header.msg_iovlen = 1;
+    header.msg_control = control.data();
+    header.msg_controllen = control.size();
+    const ssize_t count = ::recvmsg(socket, &header, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
+    if (count < 0 && (errno == EAGAIN || errno == EINTR)) return false;
+    if (count <= 0) return end(State::lost), false;
+    for (cmsghdr* item = CMSG_FIRSTHDR(&header); item != nullptr; item = CMSG_NXTHDR(&header, item)) {
+        if (item->cmsg_level != SOL_SOCKET || item->cmsg_type != SCM_RIGHTS) continue;
+        for (std::size_t place = CMSG_LEN(0); place + sizeof(int) <= item->cmsg_len; place += sizeof(int)) {
+            int descriptor = -1;
+            std::memcpy(&descriptor, reinterpret_cast<char*>(item) + place, sizeof(descriptor));
+            receivedDescriptors_.emplace_back(descriptor);
+        }
+    }
+    if ((header.msg_flags & MSG_CTRUNC) != 0 || receivedDescriptors_.size() > kMostDescriptors * 2)
+        return cutOff("more descriptors than allowed"), false;
+    incoming_.insert(incoming_.end(), buffer.begin(), buffer.begin() + count);
+    return true;
+}
+
+void SocketConnection::handleReceived() {
+    if (isOver() || !authenticate()) return;
+    while (!isPaused() && !isOver() && handleNextMessage()) {
+    }
+}
+
+bool SocketConnection::authenticate() {
+    if (isAuthenticated_) return true;
+    using Talk = dbus::ServerAuthentication::State;
+    std::string answers;
+    const Talk state =
+        side_ == Side::server ? authentication_->take(incoming_, answers) : dbus::skipAnswers(incoming_);
+    const Socket held = socket();
+    // So short that it fits into the socket's buffer, or the peer is up to no good.
+    if (!answers.empty() && held &&
+        ::send(held->get(), answers.data(), answers.size(), MSG_NOSIGNAL | MSG_DONTWAIT) !=
+            static_cast<ssize_t>(answers.size()))
+        return errno == EPIPE ? end(State::lost) : cutOff("authentication that is not read"), false;
+    if (state == Talk::failed) return cutOff("authentication failed"), false;
+    isAuthenticated_ = state == Talk::done;
+    return isAuthenticated_;
+}
+
+/// Handles the message at the front of what was received. False when it is not there as a whole.
+bool SocketConnection::handleNextMessage() {
+    if (incoming_.size() < dbus::kFixedHeader) return false;
+    const auto size = dbus::messageSize(incoming_);
+    if (!size) return cutOff(size.error().localizedDescription()), false;
+    if (incoming_.size() < *size) return false;
+    std::uint32_t descriptorCount = 0;
+    auto message = dbus::parse(std::span(incoming_).first(*size), descriptorCount);
+    if (!message) return cutOff(message.error().localizedDescription()), false;
+    if (descriptorCount > receivedDescriptors_.size()) return cutOff("fewer descriptors than claimed"), false;
+    incoming_.erase(incoming_.begin(), incoming_.begin() + static_cast<std::ptrdiff_t>(*size));
+    const auto last = receivedDescriptors_.begin() + descriptorCount;
+    message->descriptors.assign(std::make_move_iterator(receivedDescriptors_.begin()),
+                                std::make_move_iterator(last));
+    receivedDescriptors_.erase(receivedDescriptors_.begin(), last);
+    handle(std::move(*message));
+    return true;
+}
+
+}  // namespace kelvo

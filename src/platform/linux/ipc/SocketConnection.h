@@ -1,0 +1,106 @@
+#pragma once
+
+#include "platform/ConnectionBase.h"
+#include "platform/linux/ipc/Authentication.h"
+#include "platform/linux/ipc/DBusMessage.h"
+#include "platform/linux/ipc/Peer.h"
+#include "platform/linux/ipc/SocketLoop.h"
+
+#include <deque>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace kelvo {
+
+/// A connection that speaks D-Bus over a stream socket, directly with its peer. Thread-safe.
+class SocketConnection : public ConnectionBase, public SocketWatcher {
+  public:
+    enum class Side { server, client };
+
+    /// `release` runs once, when the connection has ended.
+    SocketConnection(Side side, UniqueFd socket, std::shared_ptr<SocketLoop> loop,
+                     std::shared_ptr<BundleService> bundles, Task release);
+    ~SocketConnection() override;
+
+    std::int32_t processIdentifier() const override { return peer_.processIdentifier(); }
+    Value valueForEntitlement(std::string_view name) const override { return peer_.entitlement(name); }
+
+    void ready(std::uint32_t events) override;
+    std::optional<Moment> tick(Moment now) override;
+
+  protected:
+    OptionalError transmit(std::size_t method, const IPCMethod& description, const Array& arguments,
+                           ReplyIdentifier identifier) override;
+    void didResume() override;
+    void didServe() override;
+    void close() override;
+
+  private:
+    /// A message on its way out: what is left of its bytes, and its descriptors until the first byte is gone.
+    struct Outgoing {
+        Bytes bytes;
+        std::size_t sent = 0;
+        std::vector<UniqueFd> descriptors;
+    };
+    /// What sending threads share, under `outMutex_`.
+    struct Out {
+        std::deque<Outgoing> queue;
+        std::size_t unsentBytes = 0;
+        std::size_t unsentDescriptors = 0;
+        std::uint32_t lastSerial = 0;
+        std::map<std::uint32_t, std::pair<ReplyIdentifier, std::size_t>>
+            awaited;  // by serial; and the method
+    };
+    enum class Flushed { all, some, lost };
+    using Socket = std::shared_ptr<UniqueFd>;
+
+    Socket socket() const { return socket_.copy(); }
+    bool isPaused() const;
+    /// A server says nothing before the conversation's end; a client's greeting is the first thing it sends.
+    bool maySend() const { return side_ == Side::client || isAuthenticated_; }
+    void arm();
+    void receive(int socket);
+    bool receiveSome(int socket);
+    void handleReceived();
+    bool authenticate();
+    bool handleNextMessage();
+    void handle(dbus::Message message);
+    void handleCall(dbus::Message message);
+    void handleExportedCall(dbus::Message message, std::size_t method, const IPCInterface& interface);
+    void handleStandardCall(const dbus::Message& message);
+    void handleReply(dbus::Message message);
+    IPCReply replyTo(std::uint32_t serial, const IPCMethod& method);
+    void answer(const dbus::Message& call, const std::string& signature, const Array& values);
+    void answerError(const dbus::Message& call, const char* name, const std::string& text);
+    void sendMessage(dbus::Message message);
+    OptionalError sendCall(dbus::Message message, ReplyIdentifier identifier, std::size_t method);
+    // Both under `outMutex_`.
+    std::uint32_t nextSerial();
+    bool push(dbus::Message message);
+    void afterPush(bool isWithinBounds);
+    Flushed flush(int socket);
+
+    const Side side_;
+    Guarded<Socket> socket_;
+    const std::shared_ptr<SocketLoop> loop_;
+    const Peer peer_;
+    Guarded<Task> release_;
+    std::atomic<SocketLoop::Token> token_{0};
+
+    // The loop's thread alone.
+    Bytes incoming_;
+    std::vector<UniqueFd> receivedDescriptors_;
+    std::optional<dbus::ServerAuthentication> authentication_;
+    std::optional<Moment> deadline_;
+
+    std::atomic<bool> isAuthenticated_{false};
+    std::shared_ptr<std::atomic<std::size_t>> owedReplies_ = std::make_shared<std::atomic<std::size_t>>(0);
+    std::mutex outMutex_;
+    Out out_;
+};
+
+}  // namespace kelvo

@@ -1,0 +1,202 @@
+#include "platform/linux/ipc/SocketListener.h"
+
+#include "base/KVLog.h"
+#include "platform/IPCBounds.h"
+#include "platform/linux/ipc/SocketConnection.h"
+
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <filesystem>
+#include <sys/epoll.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+namespace kelvo {
+namespace {
+
+constexpr int kBacklog = 128;
+
+/// How many connections are open, altogether and for each process.
+struct OpenConnections {
+    std::size_t all = 0;
+    std::map<std::int32_t, std::size_t> ofProcess;
+
+    bool enter(std::int32_t processIdentifier) {
+        if (all >= ipc_bounds::kMostConnections ||
+            ofProcess[processIdentifier] >= ipc_bounds::kMostConnectionsOfOneProcess)
+            return false;
+        ++all;
+        ++ofProcess[processIdentifier];
+        return true;
+    }
+    void leave(std::int32_t processIdentifier) {
+        --all;
+        if (--ofProcess[processIdentifier] == 0) ofProcess.erase(processIdentifier);
+    }
+};
+
+std::int32_t processBehind(int socket) {
+    ucred credentials{};
+    socklen_t size = sizeof(credentials);
+    return ::getsockopt(socket, SOL_SOCKET, SO_PEERCRED, &credentials, &size) == 0 ? credentials.pid : 0;
+}
+
+bool isStreamSocket(int descriptor) {
+    int domain = -1;
+    int type = -1;
+    socklen_t size = sizeof(int);
+    return ::getsockopt(descriptor, SOL_SOCKET, SO_DOMAIN, &domain, &size) == 0 && domain == AF_UNIX &&
+           ::getsockopt(descriptor, SOL_SOCKET, SO_TYPE, &type, &size) == 0 && type == SOCK_STREAM;
+}
+
+/// The connection that stands in a packet of an endpoint's socket; none for any other packet.
+UniqueFd receiveConnection(int socket, bool& isAtEnd) {
+    std::byte byte{};
+    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int))> control;
+    iovec part{&byte, 1};
+    msghdr header{};
+    header.msg_iov = &part;
+    header.msg_iovlen = 1;
+    header.msg_control = control.data();
+    header.msg_controllen = control.size();
+    const ssize_t count = ::recvmsg(socket, &header, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
+    isAtEnd = count <= 0;
+    const cmsghdr* item = isAtEnd ? nullptr : CMSG_FIRSTHDR(&header);
+    if (item == nullptr || item->cmsg_type != SCM_RIGHTS || item->cmsg_len < CMSG_LEN(sizeof(int)))
+        return UniqueFd();
+    int descriptor = -1;
+    std::memcpy(&descriptor, CMSG_DATA(item), sizeof(descriptor));
+    UniqueFd received(descriptor);
+    return isStreamSocket(descriptor) ? std::move(received) : UniqueFd();
+}
+
+}  // namespace
+
+/// What the loop holds; the listener may go while it accepts.
+class SocketListener::Door : public SocketWatcher, public std::enable_shared_from_this<Door> {
+  public:
+    Door(std::shared_ptr<SocketLoop> loop, std::shared_ptr<BundleService> bundles, bool isNamed)
+        : loop_(std::move(loop)), bundles_(std::move(bundles)), isNamed_(isNamed) {}
+
+    void setListener(SocketListener* listener) { listener_ = listener; }
+    void setSocket(UniqueFd socket) { socket_ = std::move(socket); }
+    bool hasSocket() const { return static_cast<bool>(socket_); }
+
+    void open() {
+        if (token_ == 0) token_ = loop_->add(socket_.get(), shared_from_this());
+        loop_->arm(socket_.get(), token_, EPOLLIN);
+    }
+
+    /// Nothing is accepted afterwards.
+    void shut() {
+        const std::lock_guard lock(mutex_);
+        listener_ = nullptr;
+        if (token_ != 0) loop_->remove(socket_.get(), token_);
+        ::shutdown(socket_.get(), SHUT_RDWR);
+    }
+
+    void ready(std::uint32_t) override {
+        bool isAtEnd = false;
+        while (!isAtEnd) {
+            UniqueFd next = isNamed_ ? acceptNext(isAtEnd) : receiveConnection(socket_.get(), isAtEnd);
+            if (next) welcome(std::move(next));
+        }
+        const std::lock_guard lock(mutex_);
+        if (listener_ != nullptr) loop_->arm(socket_.get(), token_, EPOLLIN);
+    }
+    std::optional<Moment> tick(Moment) override { return std::nullopt; }
+
+    Guarded<std::weak_ptr<IPCListenerDelegate>> delegate;
+
+  private:
+    UniqueFd acceptNext(bool& isAtEnd) {
+        UniqueFd next(::accept4(socket_.get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+        isAtEnd = !next;
+        return next;
+    }
+
+    void welcome(UniqueFd socket) {
+        const std::int32_t processIdentifier = processBehind(socket.get());
+        if (!open_->with([&](OpenConnections& all) { return all.enter(processIdentifier); })) {
+            KVLogError("IPC: turned away PID %d: too many connections", processIdentifier);
+            return;
+        }
+        const auto connection = std::make_shared<SocketConnection>(
+            SocketConnection::Side::server, std::move(socket), loop_, bundles_,
+            [all = open_, processIdentifier] {
+                all->with([&](OpenConnections& each) { each.leave(processIdentifier); });
+            });
+        const std::lock_guard lock(mutex_);
+        const auto decider = delegate.copy().lock();
+        const bool isKept = listener_ != nullptr && decider &&
+                            decider->listenerShouldAcceptNewConnection(*listener_, connection);
+        if (!isKept) connection->invalidate();
+    }
+
+    const std::shared_ptr<SocketLoop> loop_;
+    const std::shared_ptr<BundleService> bundles_;
+    const bool isNamed_;
+    const std::shared_ptr<Guarded<OpenConnections>> open_ = std::make_shared<Guarded<OpenConnections>>();
+    std::recursive_mutex mutex_;  // a listener stays while its delegate decides, and the delegate may drop it
+    SocketListener* listener_ = nullptr;
+    UniqueFd socket_;
+    SocketLoop::Token token_ = 0;
+};
+
+SocketListener::SocketListener(std::string path, std::shared_ptr<SocketEndpoint> endpoint,
+                               std::shared_ptr<Door> door)
+    : path_(std::move(path)), endpoint_(std::move(endpoint)), door_(std::move(door)) {
+    door_->setListener(this);
+}
+
+SocketListener::~SocketListener() {
+    door_->shut();
+    if (!path_.empty() && door_->hasSocket()) ::unlink(path_.c_str());
+}
+
+std::shared_ptr<SocketListener> SocketListener::named(std::string path, std::shared_ptr<SocketLoop> loop,
+                                                      std::shared_ptr<BundleService> bundles) {
+    auto door = std::make_shared<Door>(std::move(loop), std::move(bundles), true);
+    return std::shared_ptr<SocketListener>(new SocketListener(std::move(path), nullptr, std::move(door)));
+}
+
+Result<std::shared_ptr<IPCListener>> SocketListener::anonymous(std::shared_ptr<SocketLoop> loop,
+                                                               std::shared_ptr<BundleService> bundles) {
+    std::array<int, 2> ends{-1, -1};
+    if (::socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends.data()) != 0)
+        return KVError::posix(errno, "anonymous listener");
+    auto door = std::make_shared<Door>(std::move(loop), std::move(bundles), false);
+    door->setSocket(UniqueFd(ends[0]));
+    auto endpoint = std::make_shared<SocketEndpoint>(UniqueFd(ends[1]));
+    return std::shared_ptr<IPCListener>(new SocketListener("", std::move(endpoint), std::move(door)));
+}
+
+void SocketListener::setDelegate(std::weak_ptr<IPCListenerDelegate> delegate) {
+    door_->delegate.set(std::move(delegate));
+}
+
+void SocketListener::resume() {
+    if (door_->hasSocket()) return door_->open();
+    std::error_code ignored;  // a folder that cannot be made shows in the bind
+    std::filesystem::create_directories(std::filesystem::path(path_).parent_path(), ignored);
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    UniqueFd socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    if (path_.size() >= sizeof(address.sun_path)) errno = ENAMETOOLONG;
+    const bool isListening = path_.size() < sizeof(address.sun_path) && socket && [&] {
+        path_.copy(address.sun_path, sizeof(address.sun_path) - 1);
+        ::unlink(path_.c_str());  // the instance lock says that nobody listens there any more
+        return ::bind(socket.get(), reinterpret_cast<sockaddr*>(&address), sizeof(address)) == 0 &&
+               ::listen(socket.get(), kBacklog) == 0;
+    }();
+    if (!isListening) {
+        KVLogError("IPC: cannot listen: %s", KVError::posix(errno, path_).localizedDescription().c_str());
+        return;
+    }
+    door_->setSocket(std::move(socket));
+    door_->open();
+}
+
+}  // namespace kelvo

@@ -1,0 +1,78 @@
+#include "platform/linux/ipc/SocketTransport.h"
+
+#include "platform/linux/ipc/SocketConnection.h"
+#include "platform/linux/ipc/SocketListener.h"
+
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <sys/socket.h>
+#include <sys/un.h>
+
+namespace kelvo {
+namespace {
+
+/// Sends one end of a fresh connection to the listener behind an endpoint.
+OptionalError sendConnection(int endpoint, int connection) {
+    std::byte byte{};
+    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int))> control{};
+    iovec part{&byte, 1};
+    msghdr header{};
+    header.msg_iov = &part;
+    header.msg_iovlen = 1;
+    header.msg_control = control.data();
+    header.msg_controllen = control.size();
+    cmsghdr* item = CMSG_FIRSTHDR(&header);
+    item->cmsg_level = SOL_SOCKET;
+    item->cmsg_type = SCM_RIGHTS;
+    item->cmsg_len = CMSG_LEN(sizeof(int));
+    std::memcpy(CMSG_DATA(item), &connection, sizeof(connection));
+    if (::sendmsg(endpoint, &header, MSG_NOSIGNAL | MSG_DONTWAIT) == 1) return std::nullopt;
+    return KVError::posix(errno, "endpoint");
+}
+
+}  // namespace
+
+std::string SocketTransport::pathOf(std::string_view serviceName) const {
+    return root_->hostPath("/run/kelvod/" + std::string(serviceName));
+}
+
+std::shared_ptr<IPCListener> SocketTransport::createListener(std::string_view serviceName) {
+    return SocketListener::named(pathOf(serviceName), loop_, bundles_);
+}
+
+Result<std::shared_ptr<IPCListener>> SocketTransport::createAnonymousListener() {
+    return SocketListener::anonymous(loop_, bundles_);
+}
+
+Result<IPCConnectionRef> SocketTransport::connectToService(std::string_view serviceName) {
+    const std::string path = pathOf(serviceName);
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    if (path.size() >= sizeof(address.sun_path)) return KVError::posix(ENAMETOOLONG, path);
+    path.copy(address.sun_path, sizeof(address.sun_path) - 1);
+    UniqueFd socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    if (!socket || ::connect(socket.get(), reinterpret_cast<sockaddr*>(&address), sizeof(address)) != 0)
+        return KVError::posix(errno, path);
+    return IPCConnectionRef(std::make_shared<SocketConnection>(SocketConnection::Side::client,
+                                                               std::move(socket), loop_, bundles_, nullptr));
+}
+
+Result<IPCConnectionRef> SocketTransport::connectToEndpoint(const std::shared_ptr<IPCEndpoint>& endpoint) {
+    const auto way = std::dynamic_pointer_cast<SocketEndpoint>(endpoint);
+    if (!way) return KVError::posix(EINVAL, "endpoint");
+    std::array<int, 2> ends{-1, -1};
+    if (::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends.data()) != 0)
+        return KVError::posix(errno, "endpoint");
+    UniqueFd own(ends[0]);
+    const UniqueFd sent(ends[1]);
+    if (const OptionalError error = sendConnection(way->descriptor(), sent.get())) return *error;
+    return IPCConnectionRef(std::make_shared<SocketConnection>(SocketConnection::Side::client, std::move(own),
+                                                               loop_, bundles_, nullptr));
+}
+
+IPCConnectionRef SocketTransport::currentConnection() {
+    return ConnectionBase::current();
+}
+
+}  // namespace kelvo

@@ -1,0 +1,34 @@
+#include "platform/linux/pulse/Ticker.h"
+
+#include "base/ThreadName.h"
+
+#include <utility>
+
+namespace kelvo::pulse {
+
+Ticker::Ticker(std::string label, std::chrono::milliseconds interval, std::function<void()> tick)
+    : thread_([this, label = std::move(label), interval, tick = std::move(tick)] {
+          run(label, interval, tick);
+      }) {}
+
+Ticker::~Ticker() {
+    {
+        const std::lock_guard lock(mutex_);
+        isStopping_ = true;
+        stops_.notify_all();
+    }
+    thread_.join();
+}
+
+void Ticker::run(const std::string& label, std::chrono::milliseconds interval,
+                 const std::function<void()>& tick) {
+    nameCurrentThread(label);
+    std::unique_lock lock(mutex_);
+    while (!stops_.wait_for(lock, interval, [this] { return isStopping_; })) {
+        lock.unlock();
+        tick();
+        lock.lock();
+    }
+}
+
+}  // namespace kelvo::pulse

@@ -1,0 +1,84 @@
+#include "SoundServer.h"
+
+#include <cmath>
+#include <csignal>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <numbers>
+#include <vector>
+
+namespace kelvo::test {
+namespace {
+
+/// One minute of a sine as raw little-endian samples.
+std::string sine(int frequency) {
+    constexpr int kRate = 44100;
+    constexpr int kSeconds = 60;
+    std::string samples;
+    samples.reserve(2UL * kRate * kSeconds);
+    for (int i = 0; i < kRate * kSeconds; ++i) {
+        const double angle = 2 * std::numbers::pi * frequency * i / kRate;
+        const auto value = static_cast<std::uint16_t>(std::lround(16384 * std::sin(angle)));
+        samples += static_cast<char>(value & 0xFF);
+        samples += static_cast<char>(value >> 8);
+    }
+    return samples;
+}
+
+}  // namespace
+
+SoundServer::SoundServer() : address_("unix:" + folder_.path() + "/socket") {
+    // Of the environment that every part of libpulse reads, and that no thread reads at this time.
+    ::setenv("PULSE_SERVER", address_.c_str(), 1);  // NOLINT(concurrency-mt-unsafe)
+    ::setenv("HOME", folder_.path().c_str(), 1);    // NOLINT(concurrency-mt-unsafe)
+}
+
+SoundServer::~SoundServer() = default;
+
+bool SoundServer::start() {
+    std::filesystem::remove(folder_.path() + "/socket");
+    server_ = std::make_unique<ChildProcess>(
+        std::vector<std::string>{
+            "pulseaudio", "-n", "--daemonize=no", "--exit-idle-time=-1", "--use-pid-file=no",
+            "--log-target=stderr", "-L",
+            "module-native-protocol-unix socket=" + folder_.path() + "/socket auth-anonymous=1", "-L",
+            "module-null-sink sink_name=speaker rate=44100 norewinds=1", "-L",
+            "module-null-sink sink_name=micfeed rate=44100 norewinds=1", "-L",
+            "module-remap-source source_name=mic master=micfeed.monitor"},
+        std::map<std::string, std::string>{{"XDG_RUNTIME_DIR", folder_.path()}});
+    for (int attempt = 0; attempt < 100; ++attempt) {
+        if (control("info")) return control("set-default-source mic") && control("set-default-sink speaker");
+        ChildProcess({"sleep", "0.05"}).waitForExit();
+    }
+    return false;
+}
+
+void SoundServer::kill() {
+    server_.reset();
+}
+
+bool SoundServer::control(const std::string& command) const {
+    return ChildProcess({"sh", "-c", "timeout 5 pactl " + command + " >/dev/null 2>&1"}).waitForExit() == 0;
+}
+
+std::string SoundServer::answer(const std::string& command) const {
+    ChildProcess client({"sh", "-c", "timeout 5 pactl " + command + " >&2"});
+    client.waitForExit();
+    return client.output();
+}
+
+std::unique_ptr<ChildProcess> SoundServer::play(int frequency, const std::string& sink,
+                                                std::optional<int> process) const {
+    const std::string name = "tone" + std::to_string(frequency);
+    if (!std::filesystem::exists(folder_.path() + "/" + name)) folder_.write(name, sine(frequency));
+    std::map<std::string, std::string> environment;
+    if (process) environment["PULSE_PROP"] = "application.process.id=" + std::to_string(*process);
+    return std::make_unique<ChildProcess>(
+        std::vector<std::string>{"pacat", "--playback", "--raw", "--rate=44100", "--channels=1",
+                                 "--format=s16le", "--latency-msec=50", "--device=" + sink,
+                                 folder_.path() + "/" + name},
+        environment);
+}
+
+}  // namespace kelvo::test

@@ -1,0 +1,10 @@
+// libpulse hands memory from thread to thread through lock-free lists, which ThreadSanitizer cannot see into,
+// as the library is not built with it. Named are the functions of libpulse that write such memory; they call
+// nothing of ours.
+extern "C" const char* __tsan_default_suppressions();
+extern "C" const char* __tsan_default_suppressions() {  // NOLINT(bugprone-reserved-identifier)
+    return "race:pa_packet_new_data\n"
+           "race:pa_tagstruct_puts\n"
+           "race:pa_iochannel_read_with_ancil_data\n"
+           "race:pa_srbchannel_read\n";
+}
