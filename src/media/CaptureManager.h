@@ -33,8 +33,8 @@ class CaptureManager {
     /// Ends everything and forgets the outputs.
     virtual void stopAllCapture() = 0;
 
-    /// Where the recording's timeline begins, or where it goes on after a pause. Application audio reaches its
-    /// output from then on; `stopAllCapture` takes it back.
+    /// Where the recording's timeline begins, or where it goes on after a pause. Application audio reaches
+    /// its output from then on; `stopAllCapture` takes it back.
     virtual void setCaptureStartTime(const MediaTime& time) = 0;
 };
 
