@@ -5,6 +5,7 @@
 ///     movie_export_bench finish OUTPUT SECONDS    (writes a movie of that length, without encoding, and
 ///     finishes it)
 
+#include "ProcessorTime.h"
 #include "platform/linux/media/LavMediaService.h"
 #include "platform/linux/media/MovieFile.h"
 #include "platform/linux/media/MovieReader.h"
@@ -48,7 +49,7 @@ int exportMovie(ExportPreset preset, char** arguments, int count) {
     std::promise<void> done;
     session->exportAsynchronously([&] { done.set_value(); });
     done.get_future().wait();
-    std::printf("{\"seconds\": %.3f}\n", secondsSince(begin));
+    std::printf("{\"seconds\": %.3f, \"processor\": %.3f}\n", secondsSince(begin), processorSeconds());
     return session->status() == ExportSession::Status::completed ? 0 : 1;
 }
 

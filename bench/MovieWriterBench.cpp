@@ -2,9 +2,10 @@
 ///
 ///     movie_writer_bench RAW_VIDEO RAW_AUDIO WIDTH HEIGHT FRAMES BIT_RATE OUTPUT
 ///
-/// RAW_VIDEO holds BGRx frames at 60 a second, RAW_AUDIO 16-bit stereo at 44100 Hz. bench/movie_writer.py
+/// RAW_VIDEO holds BGRx frames at 60 a second, RAW_AUDIO 16-bit stereo at 44100 Hz. bench/movies.py
 /// makes them and runs the peer.
 
+#include "ProcessorTime.h"
 #include "platform/MediaSettings.h"
 #include "platform/linux/media/LavMediaService.h"
 #include "support/media/HostFileSystem.h"
@@ -20,15 +21,6 @@
 
 namespace kelvo::test {
 namespace {
-
-double processorSeconds() {
-    rusage usage{};
-    ::getrusage(RUSAGE_SELF, &usage);
-    const auto seconds = [](const timeval& time) {
-        return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_usec) / 1e6;
-    };
-    return seconds(usage.ru_utime) + seconds(usage.ru_stime);
-}
 
 /// A bounded pool of surfaces, as a screen source has one.
 class Pool {

@@ -4,14 +4,14 @@ namespace kelvo {
 
 Decoder::Decoder(CodecContextPointer context) : context_(std::move(context)), frame_(av_frame_alloc()) {}
 
-Result<Decoder> Decoder::open(const AVStream& stream) {
+Result<Decoder> Decoder::open(const AVStream& stream, int threadCount) {
     const AVCodec* codec = avcodec_find_decoder(stream.codecpar->codec_id);
     CodecContextPointer context(codec == nullptr ? nullptr : avcodec_alloc_context3(codec));
     if (!context || avcodec_parameters_to_context(context.get(), stream.codecpar) < 0) {
         return mediaError(kMediaErrorUnsupportedFormat, "no decoder for a track");
     }
     context->pkt_timebase = stream.time_base;
-    context->thread_count = stream.codecpar->codec_type == AVMEDIA_TYPE_VIDEO ? 0 : 1;
+    context->thread_count = threadCount;
     const int result = avcodec_open2(context.get(), codec, nullptr);
     if (result < 0) return lavError(result, kMediaErrorUnsupportedFormat, "decoder");
     Decoder decoder(std::move(context));

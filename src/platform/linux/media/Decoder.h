@@ -7,12 +7,13 @@
 
 namespace kelvo {
 
-/// Decodes one track of a movie, on as many threads as there are cores. Caller's thread.
+/// Decodes one track of a movie. Caller's thread.
 class Decoder {
   public:
     using FrameHandler = std::function<OptionalError(AVFrame&)>;
 
-    static Result<Decoder> open(const AVStream& stream);
+    /// Decodes on that many threads.
+    static Result<Decoder> open(const AVStream& stream, int threadCount);
 
     /// Decodes a packet (none: what is still inside) and hands over the frames that come out, whose times
     /// count in the stream's units. Fails on damaged content and with what `handler` fails with.

@@ -1,7 +1,4 @@
-#include "base/Guarded.h"
-#include "platform/linux/media/MovieExport.h"
-#include "platform/linux/media/MovieMuxer.h"
-#include "platform/linux/media/MovieReader.h"
+#include "platform/linux/media/ExportParts.h"
 #include "platform/linux/media/SourceTrack.h"
 
 #include <algorithm>
@@ -19,9 +16,8 @@ constexpr double kLongestSearch = 2;
 /// Carries the packets of the chosen range from the source into the new file.
 class PassThrough {
   public:
-    PassThrough(MovieReader& reader, const MediaTimeRange& range, const ExportRequest& request,
-                ExportControl& control)
-        : reader_(reader), range_(range), request_(request), control_(control) {}
+    PassThrough(const ExportSource& source, const ExportRequest& request, ExportControl& control)
+        : source_(source), request_(request), control_(control) {}
 
     OptionalError run();
 
@@ -44,44 +40,39 @@ class PassThrough {
     OptionalError beginFile();
     bool mustWaitForTracks(const AVPacket& packet) const;
     bool allTracksEnded() const;
-    double secondsFromStart(const AVPacket& packet) const;
+    double secondsFromStart(const AVPacket& packet) const {
+        return source_.secondsFromStart(packet.dts, packet.stream_index);
+    }
 
-    MovieReader& reader_;
-    const MediaTimeRange range_;
+    const ExportSource& source_;
     const ExportRequest& request_;
     ExportControl& control_;
     std::vector<std::optional<Track>> tracks_;  ///< by the source's stream number
     std::deque<PacketPointer> waiting_;         ///< until the file begins
-    std::unique_ptr<MovieMuxer> muxer_;
-    Guarded<OptionalError> muxerError_;
+    ExportFile file_;
 };
 
 OptionalError PassThrough::run() {
     if (OptionalError error = openTracks()) return error;
-    if (OptionalError error = reader_.seek(range_.start.seconds())) return error;
-    while (!control_.isCancelled && !allTracksEnded()) {
-        const auto packet = reader_.next();
-        if (!packet) return packet.error();
-        if (*packet == nullptr) break;
-        if (OptionalError error = take(**packet)) return error;
-        if (OptionalError error = muxerError_.copy()) return error;
-    }
-    if (control_.isCancelled) return std::nullopt;
-    if (OptionalError error = muxer_ ? std::nullopt : beginFile()) return error;
-    return muxer_->finish(range_.duration);
+    OptionalError error = forEachPacket(
+        source_, control_, file_, [this] { return allTracksEnded(); },
+        [this](const auto& packet) { return take(packet); });
+    if (error || control_.isCancelled) return error;
+    if (!file_.isCreated()) error = beginFile();
+    return error ? error : file_.finish(source_.range.duration);
 }
 
 OptionalError PassThrough::openTracks() {
     std::size_t number = 0;
-    for (unsigned i = 0; i < reader_.context().nb_streams; ++i) {
-        const AVStream& stream = reader_.stream(static_cast<int>(i));
+    for (unsigned i = 0; i < source_.reader->context().nb_streams; ++i) {
+        const AVStream& stream = source_.reader->stream(static_cast<int>(i));
         auto& track = tracks_.emplace_back();
         if (!isSoundOrPicture(stream)) continue;
         auto format = trackFormatOf(stream);
         if (!format) return format.error();
         const auto timescale = static_cast<std::int32_t>(format->timescale);
-        const MediaTime end = range_.start + range_.duration;
-        track = Track{std::move(*format), number++, range_.start.convertedTo(timescale).value,
+        const MediaTime end = source_.range.start + source_.range.duration;
+        track = Track{std::move(*format), number++, source_.range.start.convertedTo(timescale).value,
                       end.convertedTo(timescale).value};
     }
     return std::nullopt;
@@ -101,7 +92,7 @@ OptionalError PassThrough::take(const AVPacket& packet) {
         const std::int64_t shownFrom = std::max(track.start, packet.dts + skippedSamples(packet));
         track.format.lead = shownFrom - packet.dts;
     }
-    if (muxer_) return write(track, packet);
+    if (file_.isCreated()) return write(track, packet);
     const bool mustWait = mustWaitForTracks(packet);
     waiting_.emplace_back(av_packet_clone(&packet));
     if (!waiting_.back()) return KVError::posix(ENOMEM, "packet");
@@ -127,10 +118,7 @@ OptionalError PassThrough::beginFile() {
     for (const auto& track : tracks_) {
         if (track) formats.push_back(track->format);
     }
-    auto file = MovieFile::create(request_.outputPath, formats, MovieFile::Durability::cached);
-    if (!file) return file.error();
-    muxer_ = std::make_unique<MovieMuxer>(std::move(*file), formats,
-                                          [this](const KVError& error) { muxerError_.set(error); });
+    if (OptionalError error = file_.create(request_.outputPath, formats)) return error;
     for (const PacketPointer& packet : waiting_) {
         const Track& track = *tracks_[static_cast<std::size_t>(packet->stream_index)];
         if (OptionalError error = write(track, *packet)) return error;
@@ -144,17 +132,12 @@ OptionalError PassThrough::write(const Track& track, const AVPacket& packet) {
                               static_cast<std::uint32_t>(std::max<std::int64_t>(packet.duration, 1)),
                               (packet.flags & AV_PKT_FLAG_KEY) != 0};
     if (timing.decodeTime + track.format.lead < 0) return std::nullopt;
-    muxer_->append(track.number, timing,
-                   std::as_bytes(std::span(packet.data, static_cast<std::size_t>(packet.size))));
+    file_.append(track.number, timing,
+                 std::as_bytes(std::span(packet.data, static_cast<std::size_t>(packet.size))));
     if (track.format.type == MediaType::video) {
-        control_.advanceTo(secondsFromStart(packet) / range_.duration.seconds());
+        control_.advanceTo(secondsFromStart(packet) / source_.range.duration.seconds());
     }
     return std::nullopt;
-}
-
-double PassThrough::secondsFromStart(const AVPacket& packet) const {
-    const AVRational unit = reader_.stream(packet.stream_index).time_base;
-    return static_cast<double>(packet.dts) * av_q2d(unit) - range_.start.seconds();
 }
 
 bool PassThrough::allTracksEnded() const {
@@ -164,23 +147,9 @@ bool PassThrough::allTracksEnded() const {
 
 }  // namespace
 
-std::optional<MediaTimeRange> clippedRange(const std::optional<MediaTimeRange>& range,
-                                           const MediaTime& whole) {
-    const MediaTimeRange wanted = range.value_or(MediaTimeRange{MediaTime::zero(), whole});
-    const MediaTime start = compare(wanted.start, MediaTime::zero()) < 0 ? MediaTime::zero() : wanted.start;
-    MediaTime end = wanted.start + wanted.duration;
-    if (compare(end, whole) > 0) end = whole;
-    const MediaTimeRange clipped{start, end - start};
-    if (!(compare(clipped.duration, MediaTime::zero()) > 0)) return std::nullopt;
-    return clipped;
-}
-
 OptionalError exportPassThrough(const ExportRequest& request, ExportControl& control) {
-    const auto reader = MovieReader::open(request.sourcePath);
-    if (!reader) return reader.error();
-    const auto range = clippedRange(request.range, (*reader)->duration());
-    if (!range) return mediaError(kMediaErrorInvalidRange, "nothing of the movie lies in the time range");
-    return PassThrough(**reader, *range, request, control).run();
+    const auto source = ExportSource::open(request);
+    return source ? PassThrough(*source, request, control).run() : source.error();
 }
 
 }  // namespace kelvo
