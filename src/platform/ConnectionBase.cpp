@@ -102,6 +102,7 @@ void ConnectionBase::openGate() {
         gate.isOpen = true;
         for (Task& task : std::exchange(gate.held, {}))
             queue_.async(std::move(task));
+        if (std::exchange(gate.isLostBeforehand, false)) runHandlersLater(State::lost);
     });
 }
 
@@ -203,10 +204,18 @@ void ConnectionBase::cutOff(const std::string& reason) {
 void ConnectionBase::end(State state) {
     State expected = State::open;
     if (!state_.compare_exchange_strong(expected, state)) return;
-    const auto self = shared_from_this();
-    enqueue([self, state] { self->runHandlers(state); });
-    openGate();
+    if (state == State::over) openGate();
+    // A peer that is lost before this side is set up is reported once it is.
+    const bool isReportedNow = gate_.with([](Gate& gate) {
+        gate.isLostBeforehand = !gate.isOpen;
+        return gate.isOpen;
+    });
+    if (isReportedNow) runHandlersLater(state);
     close();
+}
+
+void ConnectionBase::runHandlersLater(State state) {
+    queue_.async([self = shared_from_this(), state] { self->runHandlers(state); });
 }
 
 void ConnectionBase::runHandlers(State state) {

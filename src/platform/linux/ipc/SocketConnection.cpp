@@ -68,6 +68,13 @@ bool SocketConnection::isPaused() const {
            waiting.descriptors >= kMostWaitingDescriptors;
 }
 
+/// Whether no more may be taken now. Remembered before it is armed: whoever serves the last message looks at
+/// it.
+bool SocketConnection::isHeldUp() {
+    if (isPaused()) isHeldUp_ = true;
+    return isHeldUp_;
+}
+
 /// Asks for what this connection can use now: input unless too much waits, output while something is unsent.
 /// Output is nearly always possible, so it also stands for "at once": for the first look, which begins the
 /// deadline of a peer that says nothing, and for what was received but held up.
@@ -93,9 +100,8 @@ void SocketConnection::ready(std::uint32_t) {
     if (flush(held->get()) == Flushed::lost) return end(State::lost);
     isHeldUp_ = false;
     handleReceived();
-    if (!isPaused() && !isOver()) receive(held->get());
+    if (!isHeldUp() && !isOver()) receive(held->get());
     if (isOver()) return;
-    if (isPaused()) isHeldUp_ = true;  // before it is armed: whoever serves the last message looks at it
     const bool isUnfinished = !isAuthenticated_ || (!incoming_.empty() && !isPaused());
     if (!isUnfinished) {
         deadline_.reset();
@@ -116,7 +122,7 @@ std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
 /// Ends after some rounds, so that a peer that never stops sending does not keep the loop for itself.
 void SocketConnection::receive(int socket) {
     constexpr int kMostRounds = 16;
-    for (int round = 0; round < kMostRounds && !isPaused() && !isOver() && receiveSome(socket); ++round)
+    for (int round = 0; round < kMostRounds && !isHeldUp() && !isOver() && receiveSome(socket); ++round)
         handleReceived();
 }
 
@@ -149,7 +155,7 @@ bool SocketConnection::receiveSome(int socket) {
 
 void SocketConnection::handleReceived() {
     if (isOver() || !authenticate()) return;
-    while (!isPaused() && !isOver() && handleNextMessage())
+    while (!isHeldUp() && !isOver() && handleNextMessage())
         deadline_.reset();
     if (incoming_.empty() && !receivedDescriptors_.empty() && !isOver())
         cutOff("descriptors that belong to no message");
@@ -162,11 +168,13 @@ bool SocketConnection::authenticate() {
     const Talk state =
         side_ == Side::server ? authentication_->take(incoming_, answers) : dbus::skipAnswers(incoming_);
     const Socket held = socket();
-    // So short that it fits into the socket's buffer, or the peer is up to no good.
+    // So short that it fits into the socket's buffer, or the peer is up to no good. One that has gone may
+    // have said its last words before: they are read first.
     if (!answers.empty() && held &&
         ::send(held->get(), answers.data(), answers.size(), MSG_NOSIGNAL | MSG_DONTWAIT) !=
-            static_cast<ssize_t>(answers.size()))
-        return errno == EPIPE ? end(State::lost) : cutOff("authentication that is not read"), false;
+            static_cast<ssize_t>(answers.size()) &&
+        errno != EPIPE && errno != ECONNRESET)
+        return cutOff("authentication that is not read"), false;
     if (state == Talk::failed) return cutOff("authentication failed"), false;
     isAuthenticated_ = state == Talk::done;
     return isAuthenticated_;

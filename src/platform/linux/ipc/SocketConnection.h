@@ -60,6 +60,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
 
     Socket socket() const { return socket_.copy(); }
     bool isPaused() const;
+    bool isHeldUp();
     /// A server says nothing before the conversation's end; a client's greeting is the first thing it sends.
     bool maySend() const { return side_ == Side::client || isAuthenticated_; }
     void arm();
