@@ -102,7 +102,21 @@ void ConnectionBase::openGate() {
         gate.isOpen = true;
         for (Task& task : std::exchange(gate.held, {}))
             queue_.async(std::move(task));
+        if (std::exchange(gate.wasLostBefore, false))
+            queue_.async([self = shared_from_this()] { self->runHandlers(State::lost); });
     });
+}
+
+/// A peer that is lost before this side is set up is reported once it is.
+void ConnectionBase::queueHandlers(State state) {
+    gate_.with([&](Gate& gate) {
+        if (state == State::lost && !gate.isOpen) {
+            gate.wasLostBefore = true;
+        } else {
+            gate.held.push_back([self = shared_from_this(), state] { self->runHandlers(state); });
+        }
+    });
+    if (state == State::over || gate_.with([](const Gate& gate) { return gate.isOpen; })) openGate();
 }
 
 void ConnectionBase::enqueue(Task task) {
@@ -204,8 +218,7 @@ void ConnectionBase::end(State state) {
     State expected = State::open;
     if (!state_.compare_exchange_strong(expected, state)) return;
     const auto self = shared_from_this();
-    enqueue([self, state] { self->runHandlers(state); });
-    openGate();
+    queueHandlers(state);
     close();
 }
 

@@ -239,7 +239,8 @@ TYPED_TEST(ClientServiceContract, ResetEndsALivingProcessWithoutItsHandlers) {
     this->pauseAndWait(client);
     this->everyone.resetConnectionWithProcessIdentifier(client.processIdentifier);
     EXPECT_TRUE(this->world.comesTrue([&] { return isInterrupted.load(); }));
-    EXPECT_THAT(this->linesAbout("connection IN"), IsEmpty());
+    this->pauseAndWait(this->connect(kOrdinary));
+    EXPECT_THAT(this->daemon->departures.copy(), IsEmpty());
     client.connection->setInterruptionHandler(nullptr);
 }
 

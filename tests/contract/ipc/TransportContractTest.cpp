@@ -205,6 +205,18 @@ TYPED_TEST(IPCTransportContract, ListenerWhoseDelegateIsGoneTakesNobody) {
     EXPECT_TRUE(this->ends(client));
 }
 
+TYPED_TEST(IPCTransportContract, PeerThatIsLostBeforeThisSideIsResumedIsReportedThen) {
+    this->host->accepts = false;
+    const ConnectedProcess process = this->world.connectFrom({}, kService);
+    const auto events = std::make_shared<Events>();
+    setUp(*process.connection, std::make_shared<Partner>(*this->transport), events);
+    EXPECT_TRUE(this->world.comesTrue([] { return true; }));
+    EXPECT_THAT(events->all(), IsEmpty());
+    process.connection->resume();
+    EXPECT_TRUE(this->world.comesTrue([&] { return events->all().size() == 2; }));
+    EXPECT_THAT(events->all(), ElementsAre("interruption", "invalidation"));
+}
+
 TYPED_TEST(IPCTransportContract, ListenerThatIsGoneLeavesItsConnections) {
     this->host->keeps = false;
     const auto client = this->connect();
@@ -415,6 +427,7 @@ TYPED_TEST(IPCTransportContract, ArgumentsThatAreNotTakenEndThatConnectionAlone)
     hostile.say("unacceptable");
     EXPECT_TRUE(this->ends(hostile));
     EXPECT_THAT(hostile.events->all(), ElementsAre("interruption", "invalidation"));
+    EXPECT_TRUE(this->world.comesTrue([&] { return !hostileEnd->all().empty(); }));
     EXPECT_THAT(hostileEnd->all(), ElementsAre("invalidation")) << "this side ended it";
     EXPECT_EQ(this->cutOffs(), 1U);
     other.ask(kAsk, {"you"});
