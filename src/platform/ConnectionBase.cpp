@@ -102,8 +102,21 @@ void ConnectionBase::openGate() {
         gate.isOpen = true;
         for (Task& task : std::exchange(gate.held, {}))
             queue_.async(std::move(task));
-        if (std::exchange(gate.isLostBeforehand, false)) runHandlersLater(State::lost);
+        if (std::exchange(gate.wasLostBefore, false))
+            queue_.async([self = shared_from_this()] { self->runHandlers(State::lost); });
     });
+}
+
+/// A peer that is lost before this side is set up is reported once it is.
+void ConnectionBase::queueHandlers(State state) {
+    gate_.with([&](Gate& gate) {
+        if (state == State::lost && !gate.isOpen) {
+            gate.wasLostBefore = true;
+        } else {
+            gate.held.push_back([self = shared_from_this(), state] { self->runHandlers(state); });
+        }
+    });
+    if (state == State::over || gate_.with([](const Gate& gate) { return gate.isOpen; })) openGate();
 }
 
 void ConnectionBase::enqueue(Task task) {
@@ -204,18 +217,9 @@ void ConnectionBase::cutOff(const std::string& reason) {
 void ConnectionBase::end(State state) {
     State expected = State::open;
     if (!state_.compare_exchange_strong(expected, state)) return;
-    if (state == State::over) openGate();
-    // A peer that is lost before this side is set up is reported once it is.
-    const bool isReportedNow = gate_.with([](Gate& gate) {
-        gate.isLostBeforehand = !gate.isOpen;
-        return gate.isOpen;
-    });
-    if (isReportedNow) runHandlersLater(state);
+    const auto self = shared_from_this();
+    queueHandlers(state);
     close();
-}
-
-void ConnectionBase::runHandlersLater(State state) {
-    queue_.async([self = shared_from_this(), state] { self->runHandlers(state); });
 }
 
 void ConnectionBase::runHandlers(State state) {

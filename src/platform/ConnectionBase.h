@@ -95,7 +95,7 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     };
     struct Gate {
         bool isOpen = false;
-        bool isLostBeforehand = false;  ///< the peer went before the gate was opened
+        bool wasLostBefore = false;  // its handlers, which are yet to be set, wait for the opening
         std::vector<Task> held;
     };
 
@@ -106,7 +106,7 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     IPCReply owed(IPCReply reply) const;
     void serve(std::size_t method, const Array& arguments, const IPCReply& reply);
     void openGate();
-    void runHandlersLater(State state);
+    void queueHandlers(State state);
     void runHandlers(State state);
 
     SerialQueue queue_;

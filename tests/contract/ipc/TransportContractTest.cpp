@@ -205,6 +205,18 @@ TYPED_TEST(IPCTransportContract, ListenerWhoseDelegateIsGoneTakesNobody) {
     EXPECT_TRUE(this->ends(client));
 }
 
+TYPED_TEST(IPCTransportContract, PeerThatIsLostBeforeThisSideIsResumedIsReportedThen) {
+    this->host->accepts = false;
+    const ConnectedProcess process = this->world.connectFrom({}, kService);
+    const auto events = std::make_shared<Events>();
+    setUp(*process.connection, std::make_shared<Partner>(*this->transport), events);
+    EXPECT_TRUE(this->world.comesTrue([] { return true; }));
+    EXPECT_THAT(events->all(), IsEmpty());
+    process.connection->resume();
+    EXPECT_TRUE(this->world.comesTrue([&] { return events->all().size() == 2; }));
+    EXPECT_THAT(events->all(), ElementsAre("interruption", "invalidation"));
+}
+
 TYPED_TEST(IPCTransportContract, ListenerThatIsGoneLeavesItsConnections) {
     this->host->keeps = false;
     const auto client = this->connect();

@@ -168,7 +168,7 @@ OptionalError SocketConnection::sendCall(dbus::Message message, ReplyIdentifier 
     const bool isWithinBounds = push(std::move(message));
     lock.unlock();
     afterPush(isWithinBounds);
-    return isOver() ? OptionalError(KVError::posix(ENOTCONN, "connection")) : std::nullopt;
+    return isOver() || cannotSend_ ? OptionalError(KVError::posix(ENOTCONN, "connection")) : std::nullopt;
 }
 
 void SocketConnection::sendMessage(dbus::Message message) {
@@ -202,19 +202,13 @@ void SocketConnection::afterPush(bool isWithinBounds) {
     if (!isWithinBounds) return cutOff("does not read what is sent to it");
     const Socket held = socket();
     if (!held) return;
-    switch (flush(held->get())) {
-        case Flushed::all:
-            return;
-        case Flushed::some:
-            return arm();
-        case Flushed::lost:
-            return end(State::lost);
-    }
+    if (flush(held->get()) == Flushed::some || cannotSend_) arm();
 }
 
 SocketConnection::Flushed SocketConnection::flush(int socket) {
     const std::lock_guard lock(outMutex_);
     if (!maySend()) return Flushed::some;
+    if (cannotSend_) out_.queue.clear();
     while (!out_.queue.empty()) {
         Outgoing& next = out_.queue.front();
         alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int) * ipc_bounds::kMostDescriptors)> control{};
@@ -236,7 +230,12 @@ SocketConnection::Flushed SocketConnection::flush(int socket) {
         }
         const ssize_t count = ::sendmsg(socket, &header, MSG_NOSIGNAL | MSG_DONTWAIT);
         if (count < 0 && errno == EINTR) continue;
-        if (count < 0) return errno == EAGAIN ? Flushed::some : Flushed::lost;
+        if (count < 0 && errno == EAGAIN) return Flushed::some;
+        if (count < 0) {
+            cannotSend_ = true;
+            out_.queue.clear();
+            break;
+        }
         out_.unsentDescriptors -= next.descriptors.size();
         next.descriptors.clear();
         next.sent += static_cast<std::size_t>(count);

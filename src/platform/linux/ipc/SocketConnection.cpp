@@ -68,13 +68,6 @@ bool SocketConnection::isPaused() const {
            waiting.descriptors >= kMostWaitingDescriptors;
 }
 
-/// Whether no more may be taken now. Remembered before it is armed: whoever serves the last message looks at
-/// it.
-bool SocketConnection::isHeldUp() {
-    if (isPaused()) isHeldUp_ = true;
-    return isHeldUp_;
-}
-
 /// Asks for what this connection can use now: input unless too much waits, output while something is unsent.
 /// Output is nearly always possible, so it also stands for "at once": for the first look, which begins the
 /// deadline of a peer that says nothing, and for what was received but held up.
@@ -84,24 +77,29 @@ void SocketConnection::arm() {
     // Under the lock, so that the latest look at the queue is also the latest to be armed.
     const std::lock_guard lock(outMutex_);
     std::uint32_t events = isPaused() ? 0U : EPOLLIN;
-    const bool isDueNow = !wasLookedAt_ || (isHeldUp_ && !isPaused());
+    const bool isDueNow = !wasLookedAt_ || ((isHeldUp_ || cannotSend_) && !isPaused());
     if (isDueNow || (maySend() && !out_.queue.empty())) events |= EPOLLOUT;
     if (events != 0) loop_->arm(held->get(), token_, events);
 }
 
 void SocketConnection::didServe() {
-    if (isHeldUp_ && !isPaused()) arm();
+    if ((isHeldUp_ || cannotSend_) && !isPaused()) arm();
 }
 
 void SocketConnection::ready(std::uint32_t) {
     const Socket held = socket();
     if (!held) return;
     wasLookedAt_ = true;
-    if (flush(held->get()) == Flushed::lost) return end(State::lost);
+    flush(held->get());
     isHeldUp_ = false;
     handleReceived();
-    if (!isHeldUp() && !isOver()) receive(held->get());
+    if (!isPaused() && !isOver()) receive(held->get());
     if (isOver()) return;
+    noteDeadline();
+    arm();
+}
+
+void SocketConnection::noteDeadline() {
     const bool isUnfinished = !isAuthenticated_ || (!incoming_.empty() && !isPaused());
     if (!isUnfinished) {
         deadline_.reset();
@@ -109,7 +107,6 @@ void SocketConnection::ready(std::uint32_t) {
         deadline_ = Moment::clock::now() + kPatience;
         loop_->tickAt(*deadline_);
     }
-    arm();
 }
 
 std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
@@ -122,8 +119,15 @@ std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
 /// Ends after some rounds, so that a peer that never stops sending does not keep the loop for itself.
 void SocketConnection::receive(int socket) {
     constexpr int kMostRounds = 16;
-    for (int round = 0; round < kMostRounds && !isHeldUp() && !isOver() && receiveSome(socket); ++round)
+    for (int round = 0; round < kMostRounds; ++round) {
+        if (isPaused() || isOver()) return;
+        if (!receiveSome(socket)) {
+            // All of what the peer sent has been taken; nothing can be told to it.
+            if (cannotSend_) end(State::lost);
+            return;
+        }
         handleReceived();
+    }
 }
 
 /// Takes what is there, within the size of one message. False when nothing is, or the connection ended.
@@ -155,8 +159,15 @@ bool SocketConnection::receiveSome(int socket) {
 
 void SocketConnection::handleReceived() {
     if (isOver() || !authenticate()) return;
-    while (!isHeldUp() && !isOver() && handleNextMessage())
+    do {
+        // Told before anybody asks again: whoever serves the last message that waits looks at it.
+        if (isPaused()) {
+            isHeldUp_ = true;
+            return;
+        }
+        if (isOver() || !handleNextMessage()) break;
         deadline_.reset();
+    } while (true);
     if (incoming_.empty() && !receivedDescriptors_.empty() && !isOver())
         cutOff("descriptors that belong to no message");
 }
@@ -168,13 +179,14 @@ bool SocketConnection::authenticate() {
     const Talk state =
         side_ == Side::server ? authentication_->take(incoming_, answers) : dbus::skipAnswers(incoming_);
     const Socket held = socket();
-    // So short that it fits into the socket's buffer, or the peer is up to no good. One that has gone may
-    // have said its last words before: they are read first.
+    // So short that it fits into the socket's buffer, or the peer is up to no good. One that is gone already
+    // may have said before what it wants.
     if (!answers.empty() && held &&
         ::send(held->get(), answers.data(), answers.size(), MSG_NOSIGNAL | MSG_DONTWAIT) !=
-            static_cast<ssize_t>(answers.size()) &&
-        errno != EPIPE && errno != ECONNRESET)
-        return cutOff("authentication that is not read"), false;
+            static_cast<ssize_t>(answers.size())) {
+        if (errno == EAGAIN) return cutOff("authentication that is not read"), false;
+        cannotSend_ = true;
+    }
     if (state == Talk::failed) return cutOff("authentication failed"), false;
     isAuthenticated_ = state == Talk::done;
     return isAuthenticated_;

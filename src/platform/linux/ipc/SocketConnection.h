@@ -55,17 +55,17 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
         std::map<std::uint32_t, std::pair<ReplyIdentifier, std::size_t>>
             awaited;  // by serial; and the method
     };
-    enum class Flushed { all, some, lost };
+    enum class Flushed { all, some };
     using Socket = std::shared_ptr<UniqueFd>;
 
     Socket socket() const { return socket_.copy(); }
     bool isPaused() const;
-    bool isHeldUp();
     /// A server says nothing before the conversation's end; a client's greeting is the first thing it sends.
     bool maySend() const { return side_ == Side::client || isAuthenticated_; }
     void arm();
     void receive(int socket);
     bool receiveSome(int socket);
+    void noteDeadline();
     void handleReceived();
     bool authenticate();
     bool handleNextMessage();
@@ -101,6 +101,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     std::atomic<bool> isAuthenticated_{false};
     std::atomic<bool> wasLookedAt_{false};  // by the loop
     std::atomic<bool> isHeldUp_{false};     // more was received than may wait
+    std::atomic<bool> cannotSend_{false};   // the peer is gone, but what it sent before still counts
     std::mutex outMutex_;
     Out out_;
 };
