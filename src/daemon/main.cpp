@@ -47,7 +47,7 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     platform.languages = std::make_shared<LocaleLanguages>();
     platform.bundles = std::make_shared<LinuxBundleService>(root, platform.languages);
     platform.preferences = std::make_shared<JsonPreferences>(root);
-    platform.device = std::make_shared<DeviceFile>(*root);
+    platform.device = std::make_shared<DeviceFile>(*root, [] { return x11::nativeScreenOrientation(""); });
     platform.notifications = std::make_shared<LinuxNotificationCenter>(root);
     platform.storagePurge = std::make_shared<VolumeWatcher>(platform.fileSystem, platform.clock,
                                                             KVTemporaryFileStore::_srTempPath());

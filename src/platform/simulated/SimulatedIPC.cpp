@@ -70,10 +70,17 @@ Result<std::shared_ptr<IPCListener>> SimulatedIPC::createAnonymousListener() {
 }
 
 std::shared_ptr<SimulatedListener> SimulatedIPC::listenerNamed(std::string_view serviceName) const {
-    return listeners_.with([&](const auto& all) {
-        const auto found = std::ranges::find(all, serviceName, &SimulatedListener::serviceName);
-        return found == all.end() ? nullptr : *found;
-    });
+    const auto all = listeners();
+    const auto found = std::ranges::find(all, serviceName, &SimulatedListener::serviceName);
+    return found == all.end() ? nullptr : *found;
+}
+
+std::vector<std::shared_ptr<SimulatedListener>> SimulatedIPC::listeners() const {
+    std::vector<std::shared_ptr<SimulatedListener>> living;
+    for (const auto& each : listeners_.copy()) {
+        if (auto listener = each.lock()) living.push_back(std::move(listener));
+    }
+    return living;
 }
 
 Result<IPCConnectionRef> SimulatedIPC::connectToService(std::string_view serviceName) {

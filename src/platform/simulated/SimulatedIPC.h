@@ -101,7 +101,8 @@ class SimulatedIPC : public IPCTransport {
 
     /// The connection on which the request came that is served from now on; none ends it.
     void setCurrentConnection(IPCConnectionRef connection) { current_.set(std::move(connection)); }
-    std::vector<std::shared_ptr<SimulatedListener>> listeners() const { return listeners_.copy(); }
+    /// Those that have not gone, oldest first.
+    std::vector<std::shared_ptr<SimulatedListener>> listeners() const;
 
     /// Waits until no connection of this transport has anything left to do, and says whether anything was
     /// done.
@@ -118,7 +119,7 @@ class SimulatedIPC : public IPCTransport {
 
     Guarded<Identity> identity_;
     Guarded<IPCConnectionRef> current_;
-    Guarded<std::vector<std::shared_ptr<SimulatedListener>>> listeners_;
+    Guarded<std::vector<std::weak_ptr<SimulatedListener>>> listeners_;
     // Held for good, as a transport holds its connections until they end; a test's transport goes soon.
     Guarded<std::vector<SimulatedConnectionRef>> connections_;
     std::atomic<std::uint64_t> settledActivity_{0};

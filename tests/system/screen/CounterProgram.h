@@ -1,18 +1,18 @@
 #pragma once
 
-#include "support/x11/XClient.h"
+#include "support/ChildProcess.h"
 
-#include <atomic>
 #include <chrono>
+#include <csignal>
 #include <cstdint>
-#include <functional>
+#include <sstream>
 #include <string>
-#include <thread>
 #include <vector>
+#include <xcb/xcb.h>
 
 namespace kelvo::test {
 
-/// A program that draws a counter into a window, so many pictures a second, and notes when it did.
+/// A program of its own that draws a counter into a window, 60 values a second, and notes when it did.
 class CounterProgram {
   public:
     using Time = std::chrono::nanoseconds;  ///< on the host's monotonic clock
@@ -24,35 +24,37 @@ class CounterProgram {
         Time done;
     };
 
-    CounterProgram(const std::string& display, const XClient::Place& place) : client_(display) {
-        window_ = client_.createWindow(place, 0);
-        client_.movePointer(0, 0);
+    CounterProgram(const std::string& display, int width, int height)
+        : process_({COUNTER_PROGRAM, display, std::to_string(width), std::to_string(height)}) {
+        if (process_.waitForLine("window ")) std::istringstream(process_.output().substr(7)) >> window_;
     }
 
     xcb_window_t window() const { return window_; }
-    XClient& client() { return client_; }
 
-    /// Draws for that long, on the calling thread.
-    void run(std::chrono::milliseconds duration, Time interval) {
-        const Time end = now() + duration;
-        for (Time next = now(); next < end; next += interval) {
-            std::this_thread::sleep_until(std::chrono::steady_clock::time_point(next));
-            const Time begun = now();
-            client_.showNumber(window_, ++number_);
-            drawings_.push_back({number_, begun, now()});
+    /// Ends the program; everything it drew.
+    std::vector<Drawing> stop() {
+        process_.signal(SIGTERM);
+        process_.waitForExit();
+        std::vector<Drawing> drawings;
+        std::istringstream lines(process_.output());
+        std::string line;
+        while (std::getline(lines, line)) {
+            std::istringstream words(line);
+            std::string verb;
+            std::uint32_t number = 0;
+            Time::rep begun = 0;
+            Time::rep done = 0;
+            if (words >> verb >> number >> begun >> done)
+                drawings.push_back({number, Time(begun), Time(done)});
         }
-        std::this_thread::sleep_for(interval);  // the last value's turn
+        return drawings;
     }
-
-    const std::vector<Drawing>& drawings() const { return drawings_; }
 
     static Time now() { return std::chrono::steady_clock::now().time_since_epoch(); }
 
   private:
-    XClient client_;
-    xcb_window_t window_;
-    std::uint32_t number_ = 0;
-    std::vector<Drawing> drawings_;
+    ChildProcess process_;
+    xcb_window_t window_ = 0;
 };
 
 }  // namespace kelvo::test

@@ -4,7 +4,7 @@
 extern "C" const char* __tsan_default_suppressions();
 extern "C" const char* __tsan_default_suppressions() {  // NOLINT(bugprone-reserved-identifier)
     return "race:pa_packet_new_data\n"
-           "race:pa_tagstruct_puts\n"
+           "race:pa_tagstruct_put\n"
            "race:pa_iochannel_read_with_ancil_data\n"
            "race:pa_srbchannel_read\n";
 }

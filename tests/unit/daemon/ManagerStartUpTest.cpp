@@ -127,14 +127,18 @@ TEST_F(ManagerStartUpTest, TearDownKeepsTheBlankedScreenRegistrationAsItAlwaysDi
 class RunDaemonTest : public test::ManagerFixture {};
 
 TEST_F(RunDaemonTest, LoopThatReturnsEndsTheProcessWithMinusOne) {
-    device.mainQueue->async([this] { device.mainQueue->stop(); });
+    std::shared_ptr<SimulatedListener> listener;
+    device.mainQueue->async([&] {
+        listener = device.ipc->listeners().front();
+        device.mainQueue->stop();
+    });
     int readyCount = 0;
     const int status = runDaemon(
         device.platform(), [](const std::string&) { return nullptr; }, [&] { ++readyCount; });
     EXPECT_EQ(status, -1);
     EXPECT_EQ(readyCount, 1);
     EXPECT_EQ(log.texts().front(), "kelvod Starting!");
-    EXPECT_EQ(device.ipc->listeners().front()->resumeCount(), 1);
+    EXPECT_EQ(listener->resumeCount(), 1);
     EXPECT_EQ(device.restrictions->observerCount(), 0U) << "the manager is torn down";
 }
 

@@ -60,6 +60,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
 
     Socket socket() const { return socket_.copy(); }
     bool isPaused() const;
+    bool isHeldUp();
     /// A server says nothing before the conversation's end; a client's greeting is the first thing it sends.
     bool maySend() const { return side_ == Side::client || isAuthenticated_; }
     void arm();
@@ -98,7 +99,8 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     std::optional<Moment> deadline_;
 
     std::atomic<bool> isAuthenticated_{false};
-    std::shared_ptr<std::atomic<std::size_t>> owedReplies_ = std::make_shared<std::atomic<std::size_t>>(0);
+    std::atomic<bool> wasLookedAt_{false};  // by the loop
+    std::atomic<bool> isHeldUp_{false};     // more was received than may wait
     std::mutex outMutex_;
     Out out_;
 };

@@ -5,6 +5,7 @@
 
 #include <cmath>
 #include <map>
+#include <utility>
 
 namespace kelvo {
 namespace {
@@ -37,7 +38,7 @@ auto property(const Dictionary& file, std::string_view key, Convert convert) -> 
 
 }  // namespace
 
-DeviceFile::DeviceFile(const DeviceRoot& root) {
+DeviceFile::DeviceFile(const DeviceRoot& root, AskScreen askScreen) : askScreen_(std::move(askScreen)) {
     const Result<Dictionary> file = readJsonFile(root.hostPath(kPath));
     if (!file) {
         KVLogError("cannot read the device file: %s", file.error().localizedDescription().c_str());
@@ -48,7 +49,15 @@ DeviceFile::DeviceFile(const DeviceRoot& root) {
     idiom_ = property(*file, "idiom", idiomFrom).value_or(idiom_);
     isInternalBuild_ = property(*file, "internalBuild", asBool).value_or(isInternalBuild_);
     chipIdentifier_ = property(*file, "chipIdentifier", asInteger).value_or(chipIdentifier_);
-    orientation_ = property(*file, "mainScreenOrientation", orientationFrom);
+    orientation_.set(property(*file, "mainScreenOrientation", orientationFrom));
+}
+
+std::optional<float> DeviceFile::mainScreenOrientation() {
+    const std::optional<float> known = orientation_.copy();
+    if (known || !askScreen_) return known;
+    const std::optional<float> answer = askScreen_();
+    if (answer) orientation_.set(answer);
+    return answer;
 }
 
 }  // namespace kelvo

@@ -28,6 +28,29 @@ TEST_F(DeviceFileTest, WithoutAFileTheDeviceIsADesktop) {
     EXPECT_TRUE(log.lines().empty());
 }
 
+TEST_F(DeviceFileTest, ScreenThatTheFileDoesNotTellOfIsAskedUntilItAnswers) {
+    std::optional<float> answer;
+    int questions = 0;
+    DeviceFile file(DeviceRoot(device.path(), "/none"), [&] {
+        ++questions;
+        return answer;
+    });
+    EXPECT_EQ(file.mainScreenOrientation(), std::nullopt);
+    answer = 90.0F;
+    EXPECT_EQ(file.mainScreenOrientation(), 90.0F);
+    EXPECT_EQ(file.mainScreenOrientation(), 90.0F);
+    EXPECT_EQ(questions, 2);
+}
+
+TEST_F(DeviceFileTest, ScreenThatTheFileTellsOfIsNotAsked) {
+    device.write("etc/kelvod/device.json", R"({"mainScreenOrientation":0})");
+    DeviceFile file(DeviceRoot(device.path(), "/none"), []() -> std::optional<float> {
+        ADD_FAILURE();
+        return 90.0F;
+    });
+    EXPECT_EQ(file.mainScreenOrientation(), 0.0F);
+}
+
 TEST_F(DeviceFileTest, EveryPropertyIsRead) {
     DeviceFile file =
         read(R"({"idiom":"tablet","internalBuild":true,"chipIdentifier":35168,"mainScreenOrientation":1.5})");
