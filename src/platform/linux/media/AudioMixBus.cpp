@@ -12,7 +12,7 @@ void limit(std::span<float> samples) {
 
 }  // namespace
 
-AudioMixBus::AudioMixBus(std::size_t trackCount, AudioEncoder& output) : output_(output) {
+AudioMixBus::AudioMixBus(std::size_t trackCount, AlignedAudioSink& output) : output_(output) {
     for (std::size_t i = 0; i < trackCount; ++i)
         tracks_.emplace_back(*this);
     output_.begin(0);

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/linux/media/AudioEncoder.h"
+#include "platform/linux/media/AudioAligner.h"
 
 #include <cstdint>
 #include <deque>
@@ -9,11 +9,11 @@
 
 namespace kelvo {
 
-/// Adds up the sound of several tracks on one timeline and encodes the sum, limited to the full scale. Holds
+/// Adds up the sound of several tracks on one timeline and hands on the sum, limited to the full scale. Holds
 /// only what lies between the track that is furthest ahead and the one furthest behind. Caller's thread.
 class AudioMixBus {
   public:
-    AudioMixBus(std::size_t trackCount, AudioEncoder& output);
+    AudioMixBus(std::size_t trackCount, AlignedAudioSink& output);
 
     /// Where the sound of one track goes.
     AlignedAudioSink& track(std::size_t index) { return tracks_[index]; }
@@ -42,7 +42,7 @@ class AudioMixBus {
     void add(std::int64_t position, std::span<const float> left, std::span<const float> right);
     OptionalError encodeUntil(std::int64_t position);
 
-    AudioEncoder& output_;
+    AlignedAudioSink& output_;
     std::deque<Track> tracks_;
     std::int64_t position_ = 0;  ///< of the first sample that is not encoded yet
     std::vector<float> left_;    ///< the sums from there on

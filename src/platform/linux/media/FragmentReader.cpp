@@ -13,6 +13,8 @@ namespace {
 
 /// Enough for nearly every fragment's header, so that one read does.
 constexpr std::size_t kFirstRead = 4 * 1024;
+/// No time of a movie is later, and none of its samples' ends overflows.
+constexpr std::uint64_t kLatestTime = std::uint64_t{1} << 56;
 
 KVError damaged() {
     return mediaError(kMediaErrorUnreadableMovie, "a fragment of the movie is damaged");
@@ -90,7 +92,9 @@ bool FragmentReader::visitTrackFragment(std::span<const std::byte> content, std:
             run_.track = std::size_t{fields.u32()} - 1;
         } else if (box->type == fourCharacterCode("tfdt")) {
             fields.u32();
-            run_.firstDecodeTime = static_cast<std::int64_t>(fields.u64());
+            const std::uint64_t time = fields.u64();
+            if (time > kLatestTime) return false;
+            run_.firstDecodeTime = static_cast<std::int64_t>(time);
         } else if (box->type == fourCharacterCode("trun")) {
             hasRun = readRun(box->content, fragmentStart, run_);
         }

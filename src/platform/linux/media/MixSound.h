@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/linux/media/AudioAligner.h"
+#include "platform/linux/media/AudioEncoder.h"
 #include "platform/linux/media/AudioMixBus.h"
 #include "platform/linux/media/Decoder.h"
 #include "platform/linux/media/ExportParts.h"

@@ -57,6 +57,7 @@ Result<std::unique_ptr<MovieReader>> MovieReader::open(const std::string& path) 
     if (!reader->packet_) return KVError::posix(ENOMEM, path);
     if (const OptionalError error = reader->check(status.st_size)) return *error;
     if (reader->context().duration <= 0) reader->findDurationOfFragments();
+    if (reader->context().duration > kLongestMovie) return unreadable("absurdly long");
     return reader;
 }
 
@@ -80,7 +81,6 @@ void MovieReader::findDurationOfFragments() {
 OptionalError MovieReader::check(std::int64_t fileSize) const {
     if (context_->nb_streams == 0) return unreadable("no tracks");
     if (context_->nb_streams > kMostTracks) return unreadable("too many tracks");
-    if (context_->duration > kLongestMovie) return unreadable("absurdly long");
     for (unsigned i = 0; i < context_->nb_streams; ++i) {
         if (!isWhole(context_->streams[i], fileSize)) return unreadable("cut short");
     }

@@ -94,9 +94,8 @@ Result<PcmBlock> readPcm(const SampleBuffer& sample) {
     PcmBlock block{sample.audioFormat().sampleRate, {}};
     for (std::size_t channel = 0; channel < layout->channelCount; ++channel) {
         auto& samples = block.channels.emplace_back(count);
-        const std::byte* first = bytes.data() + channel * channelStride;
         for (std::size_t i = 0; i < count; ++i)
-            samples[i] = readSample(first + i * sampleStride, *layout);
+            samples[i] = readSample(&bytes[channel * channelStride + i * sampleStride], *layout);
     }
     return block;
 }
