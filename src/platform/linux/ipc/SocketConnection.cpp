@@ -3,6 +3,7 @@
 #include "base/KVLog.h"
 #include "platform/IPCBounds.h"
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstring>
@@ -51,10 +52,12 @@ void SocketConnection::close() {
     if (token_ != 0) loop_->remove(held->get(), token_);
     ::shutdown(held->get(), SHUT_RDWR);
     std::deque<Outgoing> unsent;
+    std::map<std::uint32_t, LentSurfaces> lent;  // goes back to its pools after the lock is free
     {
         const std::lock_guard lock(outMutex_);
         unsent.swap(out_.queue);
         out_.awaited.clear();
+        lent.swap(out_.lent);
     }
     if (const Task release = release_.exchange(nullptr)) release();
 }
@@ -99,10 +102,15 @@ void SocketConnection::ready(std::uint32_t) {
 }
 
 std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
-    if (!deadline_ || *deadline_ > now) return deadline_;
-    deadline_.reset();
-    cutOff(isAuthenticated_ ? "message half sent and held" : "no end of authentication");
-    return std::nullopt;
+    if (deadline_ && *deadline_ <= now) {
+        deadline_.reset();
+        cutOff(isAuthenticated_ ? "message half sent and held" : "no end of authentication");
+        return std::nullopt;
+    }
+    surfaces_.dropUnused(now);
+    if (surfaces_.empty()) return deadline_;
+    const Moment next = now + SurfaceCache::kPatience;
+    return deadline_ ? std::min(*deadline_, next) : next;
 }
 
 void SocketConnection::receive(int socket) {
