@@ -1,0 +1,4 @@
+#pragma once
+
+/// Marks what programs may use of the library; everything else in it is hidden.
+#define KELVOKIT_EXPORT __attribute__((visibility("default")))
