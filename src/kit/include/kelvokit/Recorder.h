@@ -158,7 +158,7 @@ class KELVOKIT_EXPORT Recorder {
     void onConnectionRestored(std::function<void()> handler);
 
   private:
-    class Core;
+    class KELVOKIT_HIDDEN Core;
     friend struct RecorderTestAccess;
     explicit Recorder(std::shared_ptr<Core> core);
     std::shared_ptr<Core> core_;

@@ -30,7 +30,7 @@ class KELVOKIT_EXPORT Frame {
     /// None when the capture gave none.
     std::optional<SampleTime> presentationTime() const;
 
-    struct Content;
+    struct KELVOKIT_HIDDEN Content;
     explicit Frame(std::shared_ptr<const Content> content);
 
   private:
@@ -58,7 +58,7 @@ class KELVOKIT_EXPORT AudioBuffer {
     std::span<const std::byte> bytes() const;
     std::optional<SampleTime> presentationTime() const;
 
-    struct Content;
+    struct KELVOKIT_HIDDEN Content;
     explicit AudioBuffer(std::shared_ptr<const Content> content);
 
   private:
