@@ -24,6 +24,10 @@ class IPCRemoteObject {
     /// Sends method number `method` of the remote interface. Messages of one connection arrive in the order
     /// in which they were sent. `replyHandler` (may be empty) gets the reply's values, on the connection's
     /// queue, and is dropped when the connection ends first: then the error handler runs instead.
+    ///
+    /// Surfaces in a one-way message are lent: one reference to each is held until the peer has dropped its
+    /// last one, or the connection has ended, so a pool does not overwrite what a peer still reads. A peer
+    /// that holds too many is sent no further one; that delivery fails with EAGAIN.
     virtual void send(std::size_t method, Array arguments, IPCReply replyHandler) = 0;
 };
 

@@ -35,6 +35,9 @@ inline constexpr std::size_t kMostOwedReplies = 256;
 inline constexpr std::size_t kMostUnsentBytes = std::size_t{4} << 20;
 /// Descriptors among them: each pins the pixels of one frame.
 inline constexpr std::size_t kMostUnsentDescriptors = 64;
+/// Messages with surfaces of which one peer has not let go. Further ones are not sent, which cuts nobody off:
+/// a client may well hold frames, it only gets no new ones meanwhile.
+inline constexpr std::size_t kMostLentMessages = 16;
 /// Connections of one listener, and of one process among them. Further ones are closed as they come.
 inline constexpr std::size_t kMostConnections = 512;
 inline constexpr std::size_t kMostConnectionsOfOneProcess = 32;

@@ -18,7 +18,7 @@ ALLOWED = {
     "media": ["ipc", "support", "platform", "base"],
     "session": ["media", "ipc", "support", "platform", "base"],
     "daemon": ["session", "media", "ipc", "support", "platform", "base"],
-    "kit": ["base"],
+    "kit": ["ipc", "support", "platform/linux", "platform", "base"],
     "tools": ["kit", "base"],
 }
 # The one file that knows on which platform the daemon runs.

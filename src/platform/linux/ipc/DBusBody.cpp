@@ -244,8 +244,11 @@ class BodyWriter {
 /// Reads forward and remembers that it failed; after that everything reads as nothing.
 class BodyReader {
   public:
-    BodyReader(Message& message, bool objectsAllowed)
-        : message_(message), bytes_(message.body), objectsAllowed_(objectsAllowed) {}
+    BodyReader(Message& message, bool objectsAllowed, const OpenSurface& openSurface)
+        : message_(message),
+          bytes_(message.body),
+          objectsAllowed_(objectsAllowed),
+          openSurface_(openSurface) {}
 
     Result<Array> read() {
         Array values;
@@ -390,7 +393,7 @@ class BodyReader {
         geometry.bytesPerRow = take<std::uint32_t>();
         geometry.pixelFormat = static_cast<VideoSurface::PixelFormat>(take<std::uint32_t>());
         if (failure_) return {};
-        auto surface = VideoSurface::fromDescriptor(std::move(descriptor), geometry);
+        auto surface = openSurface_(std::move(descriptor), geometry);
         if (!surface) return fail("surface that is not what it claims");
         return std::shared_ptr<ObjectHandle>(*surface);
     }
@@ -420,6 +423,7 @@ class BodyReader {
     Message& message_;
     std::span<const std::byte> bytes_;
     const bool objectsAllowed_;
+    const OpenSurface& openSurface_;
     std::size_t place_ = 0;
     std::size_t values_ = 0;
     OptionalError failure_;
@@ -432,8 +436,8 @@ OptionalError writeBody(const Array& values, Message& message) {
     return KVError::posix(EINVAL, "arguments of " + message.member);
 }
 
-Result<Array> readBody(Message& message, bool objectsAllowed) {
-    return BodyReader(message, objectsAllowed).read();
+Result<Array> readBody(Message& message, bool objectsAllowed, const OpenSurface& openSurface) {
+    return BodyReader(message, objectsAllowed, openSurface).read();
 }
 
 }  // namespace kelvo::dbus

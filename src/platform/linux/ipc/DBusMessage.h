@@ -3,9 +3,11 @@
 #include "base/Result.h"
 #include "base/UniqueFd.h"
 #include "base/Value.h"
+#include "base/VideoSurface.h"
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <span>
 #include <string>
@@ -52,8 +54,13 @@ Bytes serialize(const Message& message);
 /// is a bug of the sender. Objects add to `descriptors`: duplicates, so that the object may go.
 OptionalError writeBody(const Array& values, Message& message);
 
+/// Makes a surface of what a message says about it, as `VideoSurface::fromDescriptor` does.
+using OpenSurface =
+    std::function<Result<VideoSurfaceRef>(UniqueFd descriptor, const VideoSurface::Geometry& geometry)>;
+
 /// The values of a message's body. `objectsAllowed` says whether descriptors may stand in it. Fails on
 /// anything that is not well-formed, and on a descriptor that is not what its type says.
-Result<Array> readBody(Message& message, bool objectsAllowed);
+Result<Array> readBody(Message& message, bool objectsAllowed,
+                       const OpenSurface& openSurface = VideoSurface::fromDescriptor);
 
 }  // namespace kelvo::dbus

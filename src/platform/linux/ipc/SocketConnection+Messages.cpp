@@ -68,14 +68,41 @@ void SocketConnection::handleExportedCall(dbus::Message message, std::size_t met
     const IPCMethod& description = interface.methods[method];
     if (message.signature != signatureOf(description.arguments))
         return cutOff("signature of " + description.name + " is not what it takes");
-    auto arguments = dbus::readBody(message, allowsObjects(description.arguments));
+    auto arguments = readArguments(message, description);
     if (!arguments) return cutOff(description.name + ": " + arguments.error().localizedDescription());
     IPCReply reply;
     if (message.wantsReply() && !description.isOneWay()) reply = replyTo(message.serial, description);
+    // A one-way message has nothing to say, but a caller that waits for its end is let go: at once, or when
+    // nobody uses the surfaces any more that came with it.
+    const bool isAwaited = message.wantsReply() && description.isOneWay();
+    const auto end = isAwaited ? answerAtTheEnd(message.serial) : nullptr;
+    if (end) tieSurfacesTo(end, description.arguments, *arguments);
     received(method, std::move(*arguments), std::move(reply),
              {1, message.body.size(), message.descriptors.size()});
-    // A one-way request has nothing to say, but a caller that waits for its end is let go.
-    if (message.wantsReply() && description.isOneWay()) answer(message, "", {});
+}
+
+Result<Array> SocketConnection::readArguments(dbus::Message& message, const IPCMethod& description) {
+    const bool allowed = allowsObjects(description.arguments);
+    // Only a client is sent one frame after the other.
+    if (!allowed || side_ == Side::server) return dbus::readBody(message, allowed);
+    const auto now = Moment::clock::now();
+    auto arguments =
+        dbus::readBody(message, allowed, [&](UniqueFd descriptor, const VideoSurface::Geometry& geometry) {
+            return surfaces_.open(std::move(descriptor), geometry, now);
+        });
+    if (!surfaces_.empty()) loop_->tickAt(now + SurfaceCache::kPatience);
+    return arguments;
+}
+
+/// Answers, with nothing, when its last reference goes.
+std::shared_ptr<void> SocketConnection::answerAtTheEnd(std::uint32_t serial) {
+    const std::weak_ptr weakSelf = std::static_pointer_cast<SocketConnection>(shared_from_this());
+    // What it points to is of no interest, as long as it is something.
+    return {this, [weakSelf, serial](void*) {
+                const auto self = weakSelf.lock();
+                if (self && !self->isOver())
+                    self->sendMessage(replyMessage(dbus::MessageType::reply, serial));
+            }};
 }
 
 IPCReply SocketConnection::replyTo(std::uint32_t serial, const IPCMethod& method) {
@@ -132,8 +159,10 @@ void SocketConnection::answerError(const dbus::Message& call, const char* name, 
 void SocketConnection::handleReply(dbus::Message message) {
     const auto interface = remoteInterface();
     std::pair<ReplyIdentifier, std::size_t> awaited{0, 0};
+    std::map<std::uint32_t, LentSurfaces>::node_type returned;  // goes back after the lock is free
     {
         const std::lock_guard lock(outMutex_);
+        returned = out_.lent.extract(message.replySerial);
         const auto found = out_.awaited.extract(message.replySerial);
         if (found) awaited = found.mapped();
     }
@@ -150,20 +179,28 @@ void SocketConnection::handleReply(dbus::Message message) {
 OptionalError SocketConnection::transmit(std::size_t method, const IPCMethod& description,
                                          const Array& arguments, ReplyIdentifier identifier) {
     const auto interface = remoteInterface();
+    LentSurfaces lent =
+        description.isOneWay() ? surfacesIn(description.arguments, arguments) : LentSurfaces();
     dbus::Message call;
-    call.flags = identifier == 0 ? dbus::Message::kNoReplyExpected : 0;
+    call.flags = identifier == 0 && lent.empty() ? dbus::Message::kNoReplyExpected : 0;
     call.path = kObjectPath;
     call.interface = interface->name;
     call.member = description.name;
     call.signature = signatureOf(description.arguments);
     if (OptionalError error = dbus::writeBody(arguments, call)) return error;
-    return sendCall(std::move(call), identifier, method);
+    return sendCall(std::move(call), identifier, method, std::move(lent));
 }
 
 OptionalError SocketConnection::sendCall(dbus::Message message, ReplyIdentifier identifier,
-                                         std::size_t method) {
+                                         std::size_t method, LentSurfaces surfaces) {
     std::unique_lock lock(outMutex_);
     message.serial = nextSerial();
+    if (!surfaces.empty()) {
+        // Looked at under the lock: what is lent afterwards would not be found by `close`.
+        if (isOver()) return KVError::posix(ENOTCONN, "connection");
+        if (out_.lent.size() >= ipc_bounds::kMostLentMessages) return KVError::posix(EAGAIN, "surface");
+        out_.lent.emplace(message.serial, std::move(surfaces));
+    }
     if (identifier != 0) out_.awaited[message.serial] = {identifier, method};
     const bool isWithinBounds = push(std::move(message));
     lock.unlock();

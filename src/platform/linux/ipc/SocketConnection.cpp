@@ -3,6 +3,7 @@
 #include "base/KVLog.h"
 #include "platform/IPCBounds.h"
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstring>
@@ -54,10 +55,12 @@ void SocketConnection::close() {
     if (token_ != 0) loop_->remove(held->get(), token_);
     ::shutdown(held->get(), SHUT_RDWR);
     std::deque<Outgoing> unsent;
+    std::map<std::uint32_t, LentSurfaces> lent;  // goes back to its pools after the lock is free
     {
         const std::lock_guard lock(outMutex_);
         unsent.swap(out_.queue);
         out_.awaited.clear();
+        lent.swap(out_.lent);
     }
     if (const Task release = release_.exchange(nullptr)) release();
 }
@@ -110,10 +113,15 @@ void SocketConnection::noteDeadline() {
 }
 
 std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
-    if (!deadline_ || *deadline_ > now) return deadline_;
-    deadline_.reset();
-    cutOff(isAuthenticated_ ? "message half sent and held" : "no end of authentication");
-    return std::nullopt;
+    if (deadline_ && *deadline_ <= now) {
+        deadline_.reset();
+        cutOff(isAuthenticated_ ? "message half sent and held" : "no end of authentication");
+        return std::nullopt;
+    }
+    surfaces_.dropUnused(now);
+    if (surfaces_.empty()) return deadline_;
+    const Moment next = now + SurfaceCache::kPatience;
+    return deadline_ ? std::min(*deadline_, next) : next;
 }
 
 /// Ends after some rounds, so that a peer that never stops sending does not keep the loop for itself.

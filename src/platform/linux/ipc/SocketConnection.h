@@ -5,6 +5,7 @@
 #include "platform/linux/ipc/DBusMessage.h"
 #include "platform/linux/ipc/Peer.h"
 #include "platform/linux/ipc/SocketLoop.h"
+#include "platform/linux/ipc/SurfaceLending.h"
 
 #include <deque>
 #include <map>
@@ -54,6 +55,8 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
         std::uint32_t lastSerial = 0;
         std::map<std::uint32_t, std::pair<ReplyIdentifier, std::size_t>>
             awaited;  // by serial; and the method
+        std::map<std::uint32_t, LentSurfaces>
+            lent;  // by the serial of the message that the peer has yet to let go
     };
     enum class Flushed { all, some };
     using Socket = std::shared_ptr<UniqueFd>;
@@ -74,11 +77,14 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     void handleExportedCall(dbus::Message message, std::size_t method, const IPCInterface& interface);
     void handleStandardCall(const dbus::Message& message);
     void handleReply(dbus::Message message);
+    Result<Array> readArguments(dbus::Message& message, const IPCMethod& description);
+    std::shared_ptr<void> answerAtTheEnd(std::uint32_t serial);
     IPCReply replyTo(std::uint32_t serial, const IPCMethod& method);
     void answer(const dbus::Message& call, const std::string& signature, const Array& values);
     void answerError(const dbus::Message& call, const char* name, const std::string& text);
     void sendMessage(dbus::Message message);
-    OptionalError sendCall(dbus::Message message, ReplyIdentifier identifier, std::size_t method);
+    OptionalError sendCall(dbus::Message message, ReplyIdentifier identifier, std::size_t method,
+                           LentSurfaces surfaces);
     // Both under `outMutex_`.
     std::uint32_t nextSerial();
     bool push(dbus::Message message);
@@ -97,6 +103,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     std::vector<UniqueFd> receivedDescriptors_;
     std::optional<dbus::ServerAuthentication> authentication_;
     std::optional<Moment> deadline_;
+    SurfaceCache surfaces_;
 
     std::atomic<bool> isAuthenticated_{false};
     std::atomic<bool> wasLookedAt_{false};  // by the loop

@@ -1,0 +1,70 @@
+#include "platform/linux/ipc/SurfaceLending.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <sys/stat.h>
+#include <utility>
+
+namespace kelvo {
+namespace {
+
+/// What stands behind a lent surface: goes when the surface's last reference does.
+struct Loan {
+    std::shared_ptr<ObjectHandle> surface;
+    std::shared_ptr<void> lease;
+};
+
+/// The surface of an argument that may carry one; none for any other.
+std::shared_ptr<ObjectHandle> surfaceIn(const IPCArgument& description, const Value& argument) {
+    if (description.allowedObjects != IPCObjects::surfaces) return nullptr;
+    const Array* array = argument.asArray();
+    if (array == nullptr || array->size() != 1) return nullptr;
+    const auto* handle = array->front().as<std::shared_ptr<ObjectHandle>>();
+    return handle != nullptr ? *handle : nullptr;
+}
+
+}  // namespace
+
+LentSurfaces surfacesIn(const std::vector<IPCArgument>& description, const Array& arguments) {
+    LentSurfaces surfaces;
+    for (std::size_t i = 0; i < std::min(description.size(), arguments.size()); ++i) {
+        if (auto surface = surfaceIn(description[i], arguments[i])) surfaces.push_back(std::move(surface));
+    }
+    return surfaces;
+}
+
+void tieSurfacesTo(const std::shared_ptr<void>& lease, const std::vector<IPCArgument>& description,
+                   Array& arguments) {
+    for (std::size_t i = 0; i < std::min(description.size(), arguments.size()); ++i) {
+        const auto surface = surfaceIn(description[i], arguments[i]);
+        if (!surface) continue;
+        const auto loan = std::make_shared<Loan>(Loan{surface, lease});
+        arguments[i] = Array{std::shared_ptr<ObjectHandle>(loan, surface.get())};
+    }
+}
+
+Result<VideoSurfaceRef> SurfaceCache::open(UniqueFd descriptor, const VideoSurface::Geometry& geometry,
+                                           Moment now) {
+    struct stat status {};
+    if (::fstat(descriptor.get(), &status) != 0) return KVError::posix(errno, "surface descriptor");
+    const auto known = std::ranges::find_if(entries_, [&](const Entry& entry) {
+        return entry.device == status.st_dev && entry.file == status.st_ino &&
+               entry.surface->geometry() == geometry;
+    });
+    if (known != entries_.end()) {
+        known->lastUse = now;
+        return known->surface;
+    }
+    auto surface = VideoSurface::fromDescriptor(std::move(descriptor), geometry);
+    if (!surface) return surface;
+    if (entries_.size() == kMostSurfaces)
+        entries_.erase(std::ranges::min_element(entries_, {}, &Entry::lastUse));
+    entries_.push_back({status.st_dev, status.st_ino, *surface, now});
+    return surface;
+}
+
+void SurfaceCache::dropUnused(Moment now) {
+    std::erase_if(entries_, [now](const Entry& entry) { return now - entry.lastUse >= kPatience; });
+}
+
+}  // namespace kelvo
