@@ -46,14 +46,17 @@ Result<std::shared_ptr<IPCListener>> SocketTransport::createAnonymousListener() 
 }
 
 Result<IPCConnectionRef> SocketTransport::connectToService(std::string_view serviceName) {
-    const std::string path = pathOf(serviceName);
+    return connectToSocket(pathOf(serviceName));
+}
+
+Result<IPCConnectionRef> SocketTransport::connectToSocket(const std::string& hostPath) {
     sockaddr_un address{};
     address.sun_family = AF_UNIX;
-    if (path.size() >= sizeof(address.sun_path)) return KVError::posix(ENAMETOOLONG, path);
-    path.copy(address.sun_path, sizeof(address.sun_path) - 1);
+    if (hostPath.size() >= sizeof(address.sun_path)) return KVError::posix(ENAMETOOLONG, hostPath);
+    hostPath.copy(address.sun_path, sizeof(address.sun_path) - 1);
     UniqueFd socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
     if (!socket || ::connect(socket.get(), reinterpret_cast<sockaddr*>(&address), sizeof(address)) != 0)
-        return KVError::posix(errno, path);
+        return KVError::posix(errno, hostPath);
     return IPCConnectionRef(std::make_shared<SocketConnection>(SocketConnection::Side::client,
                                                                std::move(socket), loop_, bundles_, nullptr));
 }

@@ -27,6 +27,9 @@ class SocketTransport : public IPCTransport {
     Result<IPCConnectionRef> connectToEndpoint(const std::shared_ptr<IPCEndpoint>& endpoint) override;
     IPCConnectionRef currentConnection() override;
 
+    /// As `connectToService`, by the socket's path on the host.
+    Result<IPCConnectionRef> connectToSocket(const std::string& hostPath);
+
   private:
     std::string pathOf(std::string_view serviceName) const;
 
