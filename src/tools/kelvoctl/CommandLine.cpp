@@ -21,7 +21,7 @@ struct CommandText {
     std::string_view help;
 };
 
-constexpr std::array<CommandText, 7> kCommands{{
+constexpr std::array<CommandText, 8> kCommands{{
     {Command::record, "record", "--seconds --microphone --output --size",
      "record the whole screen until Ctrl-C",
      "Usage: kelvoctl record [--seconds N] [--microphone] [--output FILE] [--size WxH]\n"
@@ -80,6 +80,21 @@ constexpr std::array<CommandText, 7> kCommands{{
      "\n"
      "Example:\n"
      "  kelvoctl watch --json | jq -r 'select(.callback == \"recordingTimerDidUpdate\").timerText'\n"},
+    {Command::shell, "shell", "--answer", "show the system's alerts here and answer them",
+     "Usage: kelvoctl shell [--answer default|alternate|other|cancel] [--json]\n"
+     "\n"
+     "Shows the alerts with which the daemon asks the user, here on the terminal, until Ctrl-C. The keys d, "
+     "a and\n"
+     "o press the button whose letter stands before it, c takes the alert away unanswered. As long as no "
+     "shell\n"
+     "runs, whatever needs consent is refused; one shell at a time can run.\n"
+     "\n"
+     "  --answer BUTTON  answer every alert at once with this button, for scripts. An alert without it is\n"
+     "                   taken away. In the alert that asks for consent \"default\" declines\n"
+     "\n"
+     "With --json each alert is an object with \"alert\" (its number), \"header\", \"message\" and "
+     "\"buttons\"; what\n"
+     "became of it follows as \"answered\" or \"withdrawn\" with that number.\n"},
 }};
 
 const CommandText* textOf(Command command) {
@@ -145,6 +160,7 @@ class Reader {
         if (name_ == "--output") return readText(line_.output, "a file");
         if (name_ == "--seconds") return readSeconds();
         if (name_ == "--size") return readSize();
+        if (name_ == "--answer") return readAnswer();
         return wrong("unknown option " + name_);
     }
 
@@ -183,6 +199,17 @@ class Reader {
         if (OptionalError error = readText(text, "a size such as 1080x1920")) return error;
         line_.size = sizeIn(text);
         if (!line_.size) return wrong("--size needs a size such as 1080x1920, not " + text);
+        return std::nullopt;
+    }
+
+    OptionalError readAnswer() {
+        constexpr std::array<std::string_view, 4> names{"default", "alternate", "other", "cancel"};
+        std::string text;
+        if (OptionalError error = readText(text, "a button")) return error;
+        const auto found = std::ranges::find(names, text);
+        if (found == names.end())
+            return wrong("--answer needs default, alternate, other or cancel, not " + text);
+        line_.answer = static_cast<SystemAlertResponse>(found - names.begin());
         return std::nullopt;
     }
 

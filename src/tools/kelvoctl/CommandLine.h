@@ -2,6 +2,7 @@
 
 #include "base/Geometry.h"
 #include "base/Result.h"
+#include "platform/SystemAlert.h"
 
 #include <optional>
 #include <span>
@@ -9,7 +10,7 @@
 
 namespace kelvo::ctl {
 
-enum class Command { none, record, stop, pause, resume, status, extensions, watch };
+enum class Command { none, record, stop, pause, resume, status, extensions, watch, shell };
 
 /// What the command line asks for.
 struct CommandLine {
@@ -22,6 +23,7 @@ struct CommandLine {
     bool wantsMicrophone = false;
     std::string output;
     std::optional<Size> size;
+    std::optional<SystemAlertResponse> answer;
 
     /// Reads the arguments behind the program's name. The error's description says which one is wrong and
     /// how. Options may stand before and behind the command; those that it does not take are errors.

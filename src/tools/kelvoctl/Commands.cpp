@@ -60,6 +60,8 @@ std::shared_ptr<void> beginCommand(Program& program) {
             return beginExtensions(program);
         case Command::watch:
             return beginWatch(program);
+        case Command::shell:
+            return beginShell(program);
         case Command::none:
             break;
     }

@@ -16,5 +16,6 @@ std::shared_ptr<void> beginResume(Program& program);
 std::shared_ptr<void> beginStatus(Program& program);
 std::shared_ptr<void> beginExtensions(Program& program);
 std::shared_ptr<void> beginWatch(Program& program);
+std::shared_ptr<void> beginShell(Program& program);
 
 }  // namespace kelvo::ctl

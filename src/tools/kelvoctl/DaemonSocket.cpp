@@ -27,6 +27,10 @@ std::string daemonSocket(const std::string& given) {
     return std::string("/run") + kSocketInRuntimeFolder;
 }
 
+std::string alertSocket(const std::string& given) {
+    return daemonSocket(given) + ".alerts";
+}
+
 std::string howToStart() {
     return "Start it with `kelvod --root DIR` and give --socket DIR/run/kelvod/com.quillon.kelvod (or set "
            "KELVO_SOCKET),\nor `systemctl --user start kelvod.socket` where it is installed.";

@@ -8,6 +8,9 @@ namespace kelvo::ctl {
 /// is there, else the system's.
 std::string daemonSocket(const std::string& given);
 
+/// The host path of the socket for shells that show alerts, beside that one.
+std::string alertSocket(const std::string& given);
+
 /// What a person is told when nobody listens there.
 std::string howToStart();
 

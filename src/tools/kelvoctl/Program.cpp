@@ -17,35 +17,47 @@ Program::~Program() {
 }
 
 int Program::run(TerminationSignals& signals) {
-    if (!connect()) return status_;
+    if (line_.command != Command::shell && !connect()) return status_;
     signals.watch([this] { mainQueue_.async([this] { interrupted(); }); });
     command_ = beginCommand(*this);
     if (!isFinished_) mainQueue_.run();
     return status_;
 }
 
-bool Program::connect() {
-    const std::string path = daemonSocket(line_.socket);
+IPCConnectionRef Program::open(const std::string& path, std::shared_ptr<const IPCInterface> exported,
+                               std::shared_ptr<IPCExportedObject> object,
+                               std::shared_ptr<const IPCInterface> remote) {
     const auto made = transport_.connectToSocket(path);
     if (!made) {
         fail("no daemon answers: " + made.error().localizedDescription() + "\n" + howToStart(), kNoDaemon);
-        return false;
+        return nullptr;
     }
     connection_ = *made;
+    connection_->setExported(std::move(exported), std::move(object));
+    connection_->setRemoteInterface(std::move(remote));
+    connection_->setInvalidationHandler(onMain([this] { lost(); }));
+    connection_->resume();
+    return connection_;
+}
+
+/// A request that cannot be delivered because the connection ended is told there.
+std::function<void(const KVError&)> Program::deliveryErrorHandler() {
+    return onMain([this](const KVError& error) {
+        if (error.code() != ENOTCONN) fail(error);
+    });
+}
+
+bool Program::connect() {
     callbacks_ = std::make_shared<Callbacks>([this](const std::string& name, const Dictionary& arguments) {
         mainQueue_.async([this, name, arguments] {
             if (callbackHandler_) callbackHandler_(name, arguments);
         });
     });
-    connection_->setExported(interfaceOf<KVClientProtocol>(),
-                             std::make_shared<ProtocolDispatcher<KVClientProtocol>>(callbacks_));
-    connection_->setRemoteInterface(interfaceOf<KVDaemonProtocol>());
-    connection_->setInvalidationHandler(onMain([this] { lost(); }));
-    // A request that cannot be delivered means that the connection ends, which is told there.
-    daemon_ = std::make_unique<KVRemoteDaemon>(*connection_, onMain([this](const KVError& error) {
-        if (error.code() != ENOTCONN) fail(error);
-    }));
-    connection_->resume();
+    if (!open(daemonSocket(line_.socket), interfaceOf<KVClientProtocol>(),
+              std::make_shared<ProtocolDispatcher<KVClientProtocol>>(callbacks_),
+              interfaceOf<KVDaemonProtocol>()))
+        return false;
+    daemon_ = std::make_unique<KVRemoteDaemon>(*connection_, deliveryErrorHandler());
     return true;
 }
 

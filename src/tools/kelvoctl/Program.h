@@ -29,6 +29,15 @@ class Program {
     int run(TerminationSignals& signals);
 
     const CommandLine& line() const { return line_; }
+    /// Connects to a socket of the daemon's, for commands that need another one; ends the program when nobody
+    /// answers there, or when the daemon goes away.
+    IPCConnectionRef open(const std::string& path, std::shared_ptr<const IPCInterface> exported,
+                          std::shared_ptr<IPCExportedObject> object,
+                          std::shared_ptr<const IPCInterface> remote);
+    /// What ends the program when a request cannot be answered.
+    std::function<void(const KVError&)> deliveryErrorHandler();
+
+    /// Only once the daemon is connected, as it is for every command but the shell.
     KVRemoteDaemon& daemon() { return *daemon_; }
     MainQueue& mainQueue() { return mainQueue_; }
     const SystemClock& clock() const { return clock_; }
@@ -61,7 +70,6 @@ class Program {
 
   private:
     bool connect();
-    bool begin();
     void interrupted();
     void lost();
 

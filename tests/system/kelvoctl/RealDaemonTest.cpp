@@ -84,6 +84,24 @@ TEST_F(KelvoctlWithDaemonTest, OutputThatExistsIsRefusedBeforeAnythingIsRecorded
               Answer(2, "kelvoctl: " + path + ": File exists\n"));
 }
 
+TEST_F(KelvoctlWithDaemonTest, OneShellAtATimeShowsAlerts) {
+    KelvoctlProcess first(socket, {"shell", "--answer", "other"});
+    ASSERT_TRUE(first.waitForLine("showing alerts")) << first.output();
+    EXPECT_EQ(KelvoctlProcess::run(socket, {"shell"}),
+              Answer(1, "kelvoctl: another shell shows the alerts\n"));
+    first.signal(SIGINT);
+    EXPECT_EQ(first.waitForExit(), 0);
+    KelvoctlProcess next(socket, {"shell", "--answer", "other"});
+    EXPECT_TRUE(next.waitForLine("showing alerts")) << next.output();
+}
+
+TEST_F(KelvoctlWithDaemonTest, ShellOutsideOfTheBundleIsRefused) {
+    const std::string copy = root.path() + "/kelvoctl";
+    std::filesystem::copy_file(KELVOCTL_PROGRAM, copy);
+    KelvoctlProcess process(socket, {"shell"}, copy);
+    EXPECT_EQ(process.waitForExit(), 1);
+}
+
 TEST_F(KelvoctlWithDaemonTest, CtrlCEndsAWatchWithSuccess) {
     KelvoctlProcess watch(socket, {"watch"});
     ASSERT_TRUE(watch.waitForLine("watching"));

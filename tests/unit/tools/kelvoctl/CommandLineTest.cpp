@@ -18,13 +18,14 @@ std::string problem(const std::vector<const char*>& arguments) {
 }
 
 TEST(CommandLineTest, EveryCommandIsKnown) {
-    const std::array<std::pair<const char*, Command>, 7> commands{{{"record", Command::record},
+    const std::array<std::pair<const char*, Command>, 8> commands{{{"record", Command::record},
                                                                    {"stop", Command::stop},
                                                                    {"pause", Command::pause},
                                                                    {"resume", Command::resume},
                                                                    {"status", Command::status},
                                                                    {"extensions", Command::extensions},
-                                                                   {"watch", Command::watch}}};
+                                                                   {"watch", Command::watch},
+                                                                   {"shell", Command::shell}}};
     for (const auto& [name, command] : commands) {
         const auto line = parse({name});
         ASSERT_TRUE(line) << name;
@@ -57,6 +58,15 @@ TEST(CommandLineTest, WhatIsWrongIsSaid) {
     EXPECT_EQ(problem({"status", "--socket"}), "--socket needs a path");
 }
 
+TEST(CommandLineTest, ButtonsThatAnswerAreKnown) {
+    EXPECT_EQ(parse({"shell", "--answer", "default"})->answer, SystemAlertResponse::defaultButton);
+    EXPECT_EQ(parse({"shell", "--answer", "alternate"})->answer, SystemAlertResponse::alternateButton);
+    EXPECT_EQ(parse({"shell", "--answer", "other"})->answer, SystemAlertResponse::otherButton);
+    EXPECT_EQ(parse({"shell", "--answer", "cancel"})->answer, SystemAlertResponse::cancelled);
+    EXPECT_EQ(problem({"shell", "--answer", "yes"}),
+              "--answer needs default, alternate, other or cancel, not yes");
+}
+
 TEST(CommandLineTest, NumbersThatAreNoneAreRefused) {
     for (const char* text : {"", "x", "0", "-1", "1s", "nan", "inf", "1e9"})
         EXPECT_NE(problem({"record", "--seconds", text}), "none") << text;
@@ -75,7 +85,7 @@ TEST(CommandLineTest, HelpNeedsNoCommandAndOverlooksTheRest) {
 
 TEST(CommandLineTest, EveryCommandHasAHelpOfItsOwnAndStandsInTheOverview) {
     const std::string overview = CommandLine::helpText(Command::none);
-    for (const char* name : {"record", "stop", "pause", "resume", "status", "extensions", "watch"}) {
+    for (const char* name : {"record", "stop", "pause", "resume", "status", "extensions", "watch", "shell"}) {
         const std::string help = CommandLine::helpText(parse({name})->command);
         EXPECT_TRUE(help.starts_with(std::string("Usage: kelvoctl ") + name)) << help;
         EXPECT_NE(overview.find(std::string("\n  ") + name + " "), std::string::npos) << name;
