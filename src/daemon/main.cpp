@@ -1,5 +1,6 @@
 #include "daemon/Options.h"
 #include "daemon/RunDaemon.h"
+#include "ipc/ShellAlerts.h"
 #include "platform/linux/absent/AbsentServices.h"
 #include "platform/linux/bundles/LinuxBundleService.h"
 #include "platform/linux/bundles/LocaleLanguages.h"
@@ -61,10 +62,10 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     platform.renderServer = std::make_shared<x11::X11RenderServer>("");
     platform.analytics = std::make_shared<UngatheredAnalytics>();
     platform.bulletins = std::make_shared<InvisibleBulletins>();
-    platform.alerts = std::make_shared<ShelllessAlerts>();
     platform.media =
         std::make_shared<LoadedMediaService>(platform.fileSystem, LoadedMediaService::usualFolders());
     platform.ipc = std::make_shared<SocketTransport>(root, platform.bundles);
+    platform.alerts = ShellAlerts::create(platform.ipc);
     return platform;
 }
 

@@ -30,8 +30,8 @@ class SystemAlert {
     virtual void cancel() = 0;
 };
 
-/// Shows alerts above everything else. Implemented by a Linux adapter that has no shell to show them, and by
-/// the simulated device. Any thread.
+/// Shows alerts above everything else. Implemented by `ShellAlerts`, through a shell process, and by the
+/// simulated device. Any thread.
 class SystemAlertService {
   public:
     virtual ~SystemAlertService() = default;

@@ -1,8 +1,7 @@
 #include "platform/simulated/SimulatedShell.h"
 
-#include <condition_variable>
-#include <mutex>
-#include <optional>
+#include "platform/PendingAlert.h"
+
 #include <utility>
 
 namespace kelvo {
@@ -37,29 +36,7 @@ std::shared_ptr<BulletinConnection> SimulatedBulletins::connect(std::string_view
     return std::make_shared<Connection>(requests_);
 }
 
-class SimulatedAlerts::Alert : public SystemAlert {
-  public:
-    SystemAlertResponse waitForResponse() override {
-        std::unique_lock lock(mutex_);
-        answered_.wait(lock, [this] { return response_.has_value(); });
-        return *response_;
-    }
-    void cancel() override { answer(SystemAlertResponse::cancelled); }
-
-    /// The first answer counts. Says whether this one did.
-    bool answer(SystemAlertResponse response) {
-        std::lock_guard lock(mutex_);
-        if (response_) return false;
-        response_ = response;
-        answered_.notify_all();
-        return true;
-    }
-
-  private:
-    std::mutex mutex_;
-    std::condition_variable answered_;
-    std::optional<SystemAlertResponse> response_;
-};
+class SimulatedAlerts::Alert : public PendingAlert {};
 
 Result<std::shared_ptr<SystemAlert>> SimulatedAlerts::createAlert(const SystemAlertContent& content) {
     if (const OptionalError fault = faults_->take("SystemAlert.createAlert")) return *fault;

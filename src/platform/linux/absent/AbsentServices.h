@@ -5,7 +5,6 @@
 #include "platform/CallObserver.h"
 #include "platform/DisplayLayout.h"
 #include "platform/RestrictionsProfile.h"
-#include "platform/SystemAlert.h"
 
 #include <cerrno>
 #include <memory>
@@ -67,14 +66,6 @@ class InvisibleBulletins : public BulletinService {
             return std::make_shared<Proxy>();
         }
     };
-};
-
-/// A device without a shell that could show an alert.
-class ShelllessAlerts : public SystemAlertService {
-  public:
-    Result<std::shared_ptr<SystemAlert>> createAlert(const SystemAlertContent&) override {
-        return KVError::posix(ENOSYS, "no system shell shows alerts");
-    }
 };
 
 }  // namespace kelvo

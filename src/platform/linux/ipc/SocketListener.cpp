@@ -2,9 +2,11 @@
 
 #include "base/KVLog.h"
 #include "platform/IPCBounds.h"
+#include "platform/linux/ipc/InheritedSocket.h"
 #include "platform/linux/ipc/SocketConnection.h"
 
 #include <array>
+#include <atomic>
 #include <cerrno>
 #include <cstring>
 #include <fcntl.h>
@@ -98,6 +100,11 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
         const std::lock_guard lock(mutex_);
         socket_ = std::move(socket);
     }
+    void setInheritedSocket(UniqueFd socket) {
+        isInherited_ = true;
+        setSocket(std::move(socket));
+    }
+    bool isInherited() const { return isInherited_; }
     bool hasSocket() {
         const std::lock_guard lock(mutex_);
         return static_cast<bool>(socket_);
@@ -114,7 +121,7 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
         const std::lock_guard lock(mutex_);
         listener_ = nullptr;
         if (token_ != 0) loop_->remove(socket_.get(), token_);
-        ::shutdown(socket_.get(), SHUT_RDWR);
+        if (!isInherited_) ::shutdown(socket_.get(), SHUT_RDWR);
     }
 
     void ready(std::uint32_t) override {
@@ -171,6 +178,7 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
     std::recursive_mutex mutex_;  // a listener stays while its delegate decides, and the delegate may drop it
     SocketListener* listener_ = nullptr;
     UniqueFd socket_;  // set before it is opened, and kept
+    std::atomic<bool> isInherited_{false};  // the service manager listens on when this process is gone
     SocketLoop::Token token_ = 0;
     UniqueFd spare_ = openNothing();  // given up to accept, and end, what cannot be kept
 };
@@ -183,7 +191,7 @@ SocketListener::SocketListener(std::string path, std::shared_ptr<SocketEndpoint>
 
 SocketListener::~SocketListener() {
     door_->shut();
-    if (!path_.empty() && door_->hasSocket()) ::unlink(path_.c_str());
+    if (!path_.empty() && door_->hasSocket() && !door_->isInherited()) ::unlink(path_.c_str());
 }
 
 std::shared_ptr<SocketListener> SocketListener::named(std::string path, std::shared_ptr<SocketLoop> loop,
@@ -209,6 +217,10 @@ void SocketListener::setDelegate(std::weak_ptr<IPCListenerDelegate> delegate) {
 
 void SocketListener::resume() {
     if (door_->hasSocket()) return door_->open();
+    if (UniqueFd inherited = inheritedSocket(path_.substr(path_.rfind('/') + 1))) {
+        door_->setInheritedSocket(std::move(inherited));
+        return door_->open();
+    }
     std::error_code ignored;  // a folder that cannot be made shows in the bind
     std::filesystem::create_directories(std::filesystem::path(path_).parent_path(), ignored);
     sockaddr_un address{};

@@ -15,7 +15,8 @@ namespace kelvo {
 /// Accepts connections on a named socket, or those that holders of an endpoint send. Thread-safe.
 class SocketListener : public IPCListener {
   public:
-    /// Listens at `path`, whose folder is made; a socket that an earlier process left there is replaced.
+    /// Listens on the socket of that name which the service manager has handed over, if it did. Else at
+    /// `path`, whose folder is made; a socket that an earlier process left there is replaced.
     static std::shared_ptr<SocketListener> named(std::string path, std::shared_ptr<SocketLoop> loop,
                                                  std::shared_ptr<BundleService> bundles);
     static Result<std::shared_ptr<IPCListener>> anonymous(std::shared_ptr<SocketLoop> loop,
