@@ -30,6 +30,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <sys/stat.h>
+#include <unistd.h>
 
 namespace kelvo {
 namespace {
@@ -39,6 +40,7 @@ constexpr const char* kLockPath = "/run/kelvod/lock";
 /// The one place that knows on which platform the daemon runs.
 Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     Platform platform;
+    platform.processIdentifier = ::getpid();
     platform.clock = std::make_shared<SystemClock>();
     platform.random = std::make_shared<KernelRandom>();
     platform.mainQueue = std::make_shared<MainQueue>(*platform.clock);
@@ -65,6 +67,11 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     platform.media =
         std::make_shared<LoadedMediaService>(platform.fileSystem, LoadedMediaService::usualFolders());
     platform.ipc = std::make_shared<SocketTransport>(root, platform.bundles);
+    platform.photoLibrary = std::make_shared<MissingPhotoLibrary>();
+    platform.sounds = std::make_shared<SilentSystemSounds>();
+    platform.applications = std::make_shared<UnwatchedApplications>();
+    platform.accessibility = std::make_shared<UnreadScreen>();
+    platform.inCarDisplay = std::make_shared<NoInCarDisplay>();
     return platform;
 }
 

@@ -49,6 +49,7 @@ DeviceFile::DeviceFile(const DeviceRoot& root) {
     isInternalBuild_ = property(*file, "internalBuild", asBool).value_or(isInternalBuild_);
     chipIdentifier_ = property(*file, "chipIdentifier", asInteger).value_or(chipIdentifier_);
     orientation_ = property(*file, "mainScreenOrientation", orientationFrom);
+    shutterClick_ = property(*file, "regionalBehaviorShutterClick", asBool);
 }
 
 }  // namespace kelvo

@@ -10,7 +10,8 @@ namespace kelvo {
 /// Device properties from "/etc/kelvod/device.json" under the device root, read once:
 ///
 ///     { "idiom": "phone" | "tablet" | "desktop", "internalBuild": false,
-///       "chipIdentifier": 0, "mainScreenOrientation": 0.0 }
+///       "chipIdentifier": 0, "mainScreenOrientation": 0.0,
+///       "regionalBehaviorShutterClick": false }
 ///
 /// Without the file, or a key of it, the device is a desktop of unknown chip and orientation and not an
 /// internal build. What cannot be understood is logged and read as missing. Immutable; thread-safe.
@@ -22,12 +23,14 @@ class DeviceFile : public DeviceProperties {
     bool isInternalBuild() override { return isInternalBuild_; }
     std::int64_t chipIdentifier() override { return chipIdentifier_; }
     std::optional<float> mainScreenOrientation() override { return orientation_; }
+    std::optional<bool> regionalBehaviorShutterClick() override { return shutterClick_; }
 
   private:
     DeviceIdiom idiom_ = DeviceIdiom::desktop;
     bool isInternalBuild_ = false;
     std::int64_t chipIdentifier_ = 0;
     std::optional<float> orientation_;
+    std::optional<bool> shutterClick_;
 };
 
 }  // namespace kelvo
