@@ -39,7 +39,7 @@ void KVRecordingManager::registerWithPlatform() {
     publicListener_ = platform_.ipc->createListener(kServiceName);
     publicListener_->setDelegate(connectionManager_);
     sessionManager_->setDelegate(weak_from_this());
-    applicationStateMonitor_ = std::make_shared<KVApplicationStateMonitor>();
+    applicationStateMonitor_ = std::make_shared<KVApplicationStateMonitor>(platform_.applications);
     callObserver_ = platform_.calls;
     callObserver_->setDelegate(weak_from_this());
     if (!isLockedRecordingEnabled()) setUpDeviceLockNotifications();

@@ -70,6 +70,9 @@ class FakeClientProxy : public KVClientProxyBase {
         resetProcesses.with([&](auto& all) { all.push_back(processIdentifier); });
     }
 
+    std::int32_t processIdentifier() const override { return process; }
+    std::int32_t process = 0;
+
     /// The names of the messages so far, in order.
     std::vector<std::string> messages() const { return messages_.copy(); }
 

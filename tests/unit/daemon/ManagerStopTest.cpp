@@ -43,12 +43,12 @@ class ManagerStopTest : public test::ManagerFixture {
 TEST_F(ManagerStopTest, ResetClearsTheSessionsState) {
     const auto recording = recordingSession("a");
     recording->paused = true;
-    recording->extensionInfo = Dictionary{{"k", 1}};
+    recording->extension = Dictionary{{"k", 1}};
     manager->resetStatesForSession(recording);
     EXPECT_TRUE(log.contains("KVRecordingManager:resetStatesForSession:"));
     EXPECT_FALSE(recording->recording);
     EXPECT_FALSE(recording->paused);
-    EXPECT_FALSE(recording->extensionInfo);
+    EXPECT_FALSE(recording->extension);
 }
 
 TEST_F(ManagerStopTest, PreparationForgetsTheBroadcastsImages) {
