@@ -119,12 +119,5 @@ TEST_F(ManagerStopTest, FailedSaveIsLogged) {
     EXPECT_TRUE(log.contains("KVRecordingManager:saveVideoToCameraRoll: Video saved to camera roll failed"));
 }
 
-TEST_F(ManagerStopTest, SaveWithoutAPhotoLibraryIsAnsweredWithItsError) {
-    OptionalError answer;
-    manager->saveVideoToCameraRoll(URL::file("/a.mp4"), [&](const OptionalError& error) { answer = error; });
-    ASSERT_TRUE(answer);
-    EXPECT_EQ(answer->code(), -5812);
-}
-
 }  // namespace
 }  // namespace kelvo
