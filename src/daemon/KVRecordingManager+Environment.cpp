@@ -1,3 +1,4 @@
+#include "base/KVLog.h"
 #include "daemon/KVRecordingManager.h"
 
 #include <algorithm>
@@ -46,6 +47,30 @@ void KVRecordingManager::layoutMonitorDidUpdateDisplayLayout(DisplayLayoutMonito
     if (elementCount != 1 && elementCount <= count) {
         sessionManager_->stopInAppRecordingSessionsBecauseOfMultitasking();
     }
+}
+
+void KVRecordingManager::broadcastSessionDidUpdateServiceInfo(const SessionRef& session,
+                                                              const Dictionary& serviceInfo) {
+    KVLog("KVRecordingManager:broadcastSessionDidUpdateServiceInfo:");
+    if (const ClientProxyRef client = session->clientProxy()) client->updateBroadcastServiceInfo(serviceInfo);
+}
+
+void KVRecordingManager::broadcastSessionDidUpdateDuration(const SessionRef& session, double seconds) {
+    KVLog("KVRecordingManager:broadcastSessionDidUpdateDuration:");
+    statusBarAssertion_->setMicrophoneEnabled(session->microphoneEnabled());
+    statusBarAssertion_->updateDoubleHeightStatusBarWithDuration(seconds, session->isPaused());
+}
+
+void KVRecordingManager::timerDidUpdate(const std::string& elapsedTime) {
+    const SessionRef system = sessionManager_->getSystemRecordingSession();
+    const ClientProxyRef client = system ? system->clientProxy() : nullptr;
+    if (client) client->recordingTimerDidUpdate(elapsedTime);
+}
+
+void KVRecordingManager::statusBarCoordinatorInvalidatedRegistrationWithError(const OptionalError&) {
+    KVLog("statusBarCoordinatior:invalidatedRegistration");
+    sessionManager_->stopSystemRecordingWithError(
+        errors_->kvUserErrorForCode(kRecordingErrorSystemDormancy, Dictionary()));
 }
 
 }  // namespace kelvo

@@ -11,14 +11,6 @@ void logNotOffered(const char* request) {
 
 }  // namespace
 
-void KVRecordingManager::startRecordingWindowLayerContextIDs(const std::vector<std::uint32_t>&, const Size&,
-                                                             bool, bool, bool, bool, bool,
-                                                             const std::shared_ptr<IPCEndpoint>&,
-                                                             StartHandler handler) {
-    logNotOffered("startRecordingWindowLayerContextIDs");
-    if (handler) handler(errors_->kvUserErrorForCode(kRecordingErrorFailedToStart), false, false);
-}
-
 void KVRecordingManager::setupBroadcastWithHostBundleID(const std::string&, const std::string&, const Bytes&,
                                                         const Dictionary&, ErrorHandler handler) {
     logNotOffered("setupBroadcastWithHostBundleID");
@@ -58,8 +50,24 @@ void KVRecordingManager::pauseRecording() {
     session->pauseSession();
 }
 
-void KVRecordingManager::resumeRecordingWithWindowLayerContextID(std::uint32_t) {
-    logNotOffered("resumeRecordingWithWindowLayerContextID");
+/// A broadcast goes on without its user being asked: there is no alert for that yet.
+void KVRecordingManager::resumeRecordingWithWindowLayerContextID(std::uint32_t windowLayerContextID) {
+    const SessionRef session = getCallingConnectionRecordingSession();
+    if (!session || session->isSystemRecording()) return;
+    const bool isPausedRecording = session->isRecording() && session->isPaused();
+    if (checkContextIDsMatch({windowLayerContextID})) {
+        KVLog("KVRecordingManager: resumeRecording");
+        if (isPausedRecording) session->resumeSessionWithContextID(windowLayerContextID);
+        return;
+    }
+    if (!isPausedRecording) return;
+    sessionManager_->stopRecordingSession(
+        session, 0, 0, [weakSelf = weak_from_this(), session](const auto& movieURL, const auto&) {
+            const auto self = weakSelf.lock();
+            if (!self || !movieURL) return;
+            self->recordingSessionStoppedWithError(
+                session, self->errors_->kvUserErrorForCode(kRecordingErrorNoContextIDMatch), movieURL);
+        });
 }
 
 void KVRecordingManager::setMicrophoneEnabled(bool enabled) {
@@ -70,8 +78,11 @@ void KVRecordingManager::setMicrophoneEnabled(bool enabled) {
     if (const ClientProxyRef client = session->clientProxy()) client->updateScreenRecordingState();
 }
 
-void KVRecordingManager::updateProcessIDForAudioCaptureWithPID(std::int32_t) {
-    logNotOffered("updateProcessIDForAudioCaptureWithPID");
+void KVRecordingManager::updateProcessIDForAudioCaptureWithPID(std::int32_t processIdentifier) {
+    KVLog("KVRecordingManager: updateProcessIDForAudioCaptureWithPID:%i", processIdentifier);
+    if (!clientHasSystemEntitlements()) return;
+    const SessionRef session = getCallingConnectionRecordingSession();
+    if (session && session->isRecording()) session->updateProcessIDForAudioCaptureWithPID(processIdentifier);
 }
 
 void KVRecordingManager::discardRecordingWithHandler(DoneHandler handler) {
@@ -137,12 +148,15 @@ void KVRecordingManager::connectionManagerDidAcceptNewConnection(
         sessionManager_->recordingSessionInstanceWithBundleIdentifier(bundleIdentifier.value_or(""));
     // A proxy that nobody holds would end the connection of a peer that is welcome.
     if (session) session->setClientProxy(KVClientProxyFactory::clientProxyWithNewConnection(connection));
+    expireAcknowledgementExemptionsForBundleID(bundleIdentifier);
 }
 
 void KVRecordingManager::applicationDisconnectedWithBundleID(
     const std::optional<std::string>& bundleIdentifier, std::int32_t processIdentifier) {
     KVLog("KVRecordingManager: applicationDisconnected");
     sessionManager_->applicationDisconnectedWithBundleID(bundleIdentifier.value_or(""), processIdentifier);
+    // What is gone comes neither to the foreground nor back.
+    applicationStateMonitor_->removeObserverWithProcessIdentifier(processIdentifier);
 }
 
 }  // namespace kelvo

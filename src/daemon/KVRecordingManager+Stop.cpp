@@ -1,11 +1,39 @@
 #include "base/KVLog.h"
 #include "daemon/KVRecordingManager.h"
 
+#include <utility>
+
 namespace kelvo {
 
+void KVRecordingManager::stopCurrentRecordingSessionWithHandler(ErrorHandler handler) {
+    KVLog("KVRecordingManager:stopCurrentRecordingSession:");
+    sessionManager_->stopCurrentRecordingSessionWithHandler(
+        [weakSelf = weak_from_this(), handler = std::move(handler)](const auto& movieURL, const auto&) {
+            if (const auto self = weakSelf.lock()) self->currentSessionStopped(movieURL);
+            if (handler) handler(std::nullopt);
+        });
+}
+
+/// The movie is saved as it is, and its file stays: whoever starts a recording is not kept waiting.
+void KVRecordingManager::currentSessionStopped(const std::optional<URL>& movieURL) {
+    KVLog("stop monitoring foreground apps");
+    applicationStateMonitor_->removeSystemObserver();
+    statusBarAssertion_->invalidateDoubleHeightStatusBar();
+    if (!movieURL) return;
+    const auto asset = platform_.photoLibrary->createVideoAsset(*movieURL);
+    if (!asset) {
+        KVLog("KVRecordingManager:stopCurrentRecordingSession: Video saved to camera roll failed");
+        return;
+    }
+    KVLog("KVRecordingManager:stopCurrentRecordingSession: Video saved to camera roll successful");
+    displayScreenRecorderBulletinWithURL(asset->localIdentifier);
+}
+
 void KVRecordingManager::prepareForStoppingSession(const SessionRef& session) {
+    checkAndPlaySystemRecordSound(session, false);
     clearSystemRecordingUI(session);
-    if (session && session->isRecording() && layoutMonitor_) layoutMonitor_->removeObserver(this);
+    const auto monitor = layoutMonitor();
+    if (session && session->isRecording() && monitor) monitor->removeObserver(this);
     currentHostAppImage_.set(std::nullopt);
     currentExtensionAppImage_.set(std::nullopt);
     currentExtensionDisplayName_.set(std::nullopt);
@@ -22,28 +50,30 @@ void KVRecordingManager::resetStatesForSession(const SessionRef& session) {
 }
 
 void KVRecordingManager::recordingSessionStoppedWithError(const SessionRef& session,
+                                                          const OptionalError& error) {
+    recordingSessionStoppedWithError(session, error, std::nullopt);
+}
+
+void KVRecordingManager::recordingSessionStoppedWithError(const SessionRef& session,
                                                           const OptionalError& error,
                                                           const std::optional<URL>& movieURL) {
     KVLog("KVRecordingManager:recordingSessionStoppedWithError:movieURL:");
+    // A broadcast's own alert leads to its extension's application, which nobody can look up yet.
+    if (session && session->isSystemRecording() && !session->broadcastExtension()) {
+        showOnAlertQueue([session, error](KVRecordingManager& manager) {
+            manager.showAlertForRecordingSession(session, error);
+        });
+    }
     clearSystemRecordingUI(session);
     const ClientProxyRef client = session ? session->clientProxy() : nullptr;
     if (client) client->recordingDidStopWithError(error, movieURL);
-}
-
-void KVRecordingManager::failedToSaveRecordingForRecordingSession(const SessionRef&, const KVError&) {
-    KVLog("KVRecordingManager:saveVideoToCameraRoll: Video saved to camera roll failed");
-}
-
-/// There is no photo library to save to yet: the movie stays in the store and the caller is told.
-void KVRecordingManager::saveVideoToCameraRoll(const std::optional<URL>&, ErrorHandler completion) {
-    KVLog("KVRecordingManager: saveVideoToCameraRoll:");
-    if (completion) completion(errors_->kvUserErrorForCode(kRecordingErrorFailedToSave));
 }
 
 /// Takes away what shows the user that the whole screen is recorded.
 void KVRecordingManager::clearSystemRecordingUI(const SessionRef& session) {
     if (!session || !session->isSystemRecording()) return;
     KVLog("stop monitoring foreground apps");
+    applicationStateMonitor_->removeSystemObserver();
     if (const auto alert = userNotificationStopRecording_.copy()) alert->cancel();
     if (statusBarAssertion_) statusBarAssertion_->invalidateDoubleHeightStatusBar();
 }

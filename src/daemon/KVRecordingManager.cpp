@@ -28,6 +28,7 @@ KVRecordingManager::KVRecordingManager(const Platform& platform, SessionFactory 
       errors_(std::make_shared<KVUserErrors>(localization_)),
       fileStore_(
           std::make_shared<KVTemporaryFileStore>(platform.fileSystem, platform.textFolding, platform.clock)),
+      mixer_(std::make_shared<KVAudioMixUtility>(platform.media, platform.clock, errors_)),
       sessionManager_(std::make_shared<KVSessionManager>(std::move(createSession), errors_)) {}
 
 /// The second half of construction: services get weak references to the manager, which a constructor cannot
@@ -39,10 +40,12 @@ void KVRecordingManager::registerWithPlatform() {
     publicListener_ = platform_.ipc->createListener(kServiceName);
     publicListener_->setDelegate(connectionManager_);
     sessionManager_->setDelegate(weak_from_this());
-    applicationStateMonitor_ = std::make_shared<KVApplicationStateMonitor>();
+    applicationStateMonitor_ = std::make_shared<KVApplicationStateMonitor>(platform_.applications);
     callObserver_ = platform_.calls;
     callObserver_->setDelegate(weak_from_this());
-    if (!isLockedRecordingEnabled()) setUpDeviceLockNotifications();
+    // Engineers record with the screen blank.
+    if (!isEngineersPreferencePresent("KVEnableLockedRecording", "enableLockedRecording"))
+        setUpDeviceLockNotifications();
     statusBarAssertion_ = std::make_shared<KVStatusBarAssertion>();
     connectBulletins();
     platform_.restrictions->addObserver(weak_from_this());
@@ -50,9 +53,9 @@ void KVRecordingManager::registerWithPlatform() {
 }
 
 KVRecordingManager::~KVRecordingManager() {
-    if (layoutMonitor_) {
-        layoutMonitor_->removeObserver(this);
-        layoutMonitor_->invalidate();
+    if (const auto monitor = layoutMonitor()) {
+        monitor->removeObserver(this);
+        monitor->invalidate();
     }
     platform_.notifications->removeObservers(kLockStatusNotification);
     platform_.restrictions->removeObserver(this);
@@ -67,16 +70,6 @@ void KVRecordingManager::finishStartup() {
 SerialQueue& KVRecordingManager::kelvoAlertQueue() {
     static SerialQueue queue("com.kelvokit.alertQueue");
     return queue;
-}
-
-/// Whether recordings go on while the screen is blank: the preference counts by being there, whatever it
-/// holds, and only on an internal build.
-bool KVRecordingManager::isLockedRecordingEnabled() const {
-    if (!platform_.device->isInternalBuild()) return false;
-    const bool isPresent =
-        !platform_.preferences->value("KVEnableLockedRecording", kPreferencesDomain).isNothing();
-    KVLog("KVRecordingManager: enableLockedRecording=%d", isPresent ? 1 : 0);
-    return isPresent;
 }
 
 void KVRecordingManager::connectBulletins() {

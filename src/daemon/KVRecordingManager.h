@@ -2,10 +2,13 @@
 
 #include "base/Guarded.h"
 #include "base/SerialQueue.h"
+#include "daemon/StartRequest.h"
 #include "ipc/KVConnectionManager.h"
 #include "ipc/KVUserErrors.h"
+#include "media/KVAudioMixUtility.h"
 #include "platform/PhotoAsset.h"
 #include "platform/Platform.h"
+#include "session/KVRecordingSessionDelegate.h"
 #include "session/KVSessionManager.h"
 #include "support/KVApplicationStateMonitor.h"
 #include "support/KVLocalization.h"
@@ -13,7 +16,9 @@
 #include "support/KVTemporaryFileStore.h"
 
 #include <atomic>
+#include <functional>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <set>
 #include <string>
@@ -28,6 +33,9 @@ namespace kelvo {
 /// services' threads, alerts on the alert queue; state that several of them touch is atomic or guarded.
 class KVRecordingManager : public KVConnectionManagerDelegate,
                            public KVSessionManagerDelegate,
+                           public KVRecordingSessionDelegate,
+                           public KVStatusBarAssertionDelegate,
+                           public StatusBarCoordinatorDelegate,
                            public CallObserverDelegate,
                            public RestrictionsObserver,
                            public DisplayLayoutObserver,
@@ -64,6 +72,38 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
                                           const std::optional<URL>& movieURL) override;
     void failedToSaveRecordingForRecordingSession(const SessionRef& session, const KVError& error) override;
     void saveVideoToCameraRoll(const std::optional<URL>& movieURL, ErrorHandler completion) override;
+
+    /// Stops whatever records and saves the movie of a system recording; `handler` (may be none) never gets
+    /// an error. Caller's thread, or where the stopped session finishes.
+    void stopCurrentRecordingSessionWithHandler(ErrorHandler handler);
+
+    // Recording sessions' delegate.
+    void recordingSessionStoppedWithError(const SessionRef& session, const OptionalError& error) override;
+    void broadcastSessionDidUpdateServiceInfo(const SessionRef& session,
+                                              const Dictionary& serviceInfo) override;
+    void broadcastSessionDidUpdateDuration(const SessionRef& session, double seconds) override;
+    void recordingSessionClientDidEnterBackground(const SessionRef& session) override;
+    void recordingSessionClientDidEnterForeground(const SessionRef& session) override;
+
+    // The status bar's delegates.
+    void timerDidUpdate(const std::string& elapsedTime) override;
+    void statusBarCoordinatorInvalidatedRegistrationWithError(const OptionalError& error) override;
+
+    // Consent, keyed by bundle identifier. An application that the user let record needs no alert until it
+    // has been in the background for more than eight minutes.
+    /// Asks the user, and blocks until there is an answer. True: go ahead, perhaps with the microphone and
+    /// the camera switched off in the manager.
+    bool showAcknowledgementAlertForSession(const SessionRef& session, bool isBroadcast);
+    bool isExemptFromAcknowledgementAlertSession(const SessionRef& session) const;
+    void updateExemptionListWithSession(const SessionRef& session);
+    void expireAcknowledgementExemptionsForBundleID(const std::optional<std::string>& bundleIdentifier);
+
+    /// Whether every context is drawn by a process of the caller's bundle; true for no contexts.
+    bool checkContextIDsMatch(const std::vector<std::uint32_t>& contextIDs) const;
+
+    // Alerts about system recordings, on the alert queue, which they block until they are answered.
+    void showAlertForRecordingSession(const SessionRef& session, const OptionalError& error);
+    void showAlertRecordingSessionFailedToSaveFile(const SessionRef& session, const OptionalError& error);
 
     // Client requests, on the connection manager's queue. One that the daemon does not offer yet is answered
     // with an error of the domain; without a handler to tell it to, it is logged and does nothing.
@@ -132,9 +172,9 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
         return dataProviderConnection_;
     }
     const std::shared_ptr<BulletinProxy>& dataProviderProxy() const { return dataProviderProxy_; }
-    const std::shared_ptr<DisplayLayoutMonitor>& layoutMonitor() const { return layoutMonitor_; }
+    std::shared_ptr<DisplayLayoutMonitor> layoutMonitor() const { return layoutMonitor_.copy(); }
     void setLayoutMonitor(std::shared_ptr<DisplayLayoutMonitor> monitor) {
-        layoutMonitor_ = std::move(monitor);
+        layoutMonitor_.set(std::move(monitor));
     }
 
     bool isMicrophoneRecording() const { return microphoneRecording_; }
@@ -168,18 +208,47 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
   private:
     KVRecordingManager(const Platform& platform, SessionFactory createSession);
     void registerWithPlatform();
-    bool isLockedRecordingEnabled() const;
     void setUpDeviceLockNotifications();
     void blankedScreenChanged(NotificationToken token);
     void connectBulletins();
     void registerPurgeCallbacks();
     void clearSystemRecordingUI(const SessionRef& session);
+    std::string localized(std::string_view key) const;
+    /// Whether an engineer set the preference, whatever it holds; `name` is for the log.
+    bool isEngineersPreferencePresent(const char* key, const char* name) const;
+
+    // The steps of a start. Those that give a boolean have answered the client when it is false.
+    bool isClientAllowedToStart(const StartRequest& request);
+    void continueStart(const StartRequestRef& request);
+    bool isDeviceReadyFor(const StartRequest& request);
+    bool doesUserConsent(const StartRequest& request);
+    bool isScreenFreeFor(const StartRequest& request);
+    bool prepareBroadcast(const StartRequest& request);
+    void configureSession(const StartRequest& request);
+    void frontmostSession(const SessionRef& session, std::function<void(std::int32_t)> applicationPID);
+    void recordingStarted(const StartRequest& request);
+    bool isStatusBarHidden() const;
+    void showStatusBar(const StartRequest& request);
+    void checkAndPlaySystemRecordSound(const SessionRef& session, bool isRecordingOn);
+
+    SystemAlertContent acknowledgementAlert(const RecordingSession& session, bool isBroadcast) const;
+    SystemAlertContent acknowledgementButtons(bool isBroadcast) const;
+    void userConsented(const SessionRef& session);
+    void userConsentedToLess(const SessionRef& session);
+
+    void showOnAlertQueue(std::function<void(KVRecordingManager&)> show);
+    void showFailureAlert(std::string_view messageKey, const OptionalError& error);
+    void currentSessionStopped(const std::optional<URL>& movieURL);
+    void saveFinishedMovie(const std::optional<URL>& movieURL, const std::optional<URL>& mixedURL,
+                           const ErrorHandler& completion);
+    void displayScreenRecorderBulletinWithURL(const std::string& localIdentifier);
 
     const Platform platform_;
     const std::shared_ptr<KVLocalization> localization_;
     const std::shared_ptr<KVUserErrors> errors_;
     const std::shared_ptr<KVTemporaryFileStore> fileStore_;
 
+    const std::shared_ptr<KVAudioMixUtility> mixer_;
     std::shared_ptr<KVConnectionManager> connectionManager_;
     std::shared_ptr<IPCListener> publicListener_;
     std::shared_ptr<KVSessionManager> sessionManager_;
@@ -189,7 +258,8 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
     SerialQueue dataProviderQueue_{"com.quillon.kelvod.bulletinboard"};
     std::shared_ptr<BulletinConnection> dataProviderConnection_;
     std::shared_ptr<BulletinProxy> dataProviderProxy_;
-    std::shared_ptr<DisplayLayoutMonitor> layoutMonitor_;
+    std::once_flag layoutMonitorCreated_;
+    Guarded<std::shared_ptr<DisplayLayoutMonitor>> layoutMonitor_;
 
     std::atomic<bool> microphoneRecording_{false};
     std::atomic<bool> cameraRecording_{false};

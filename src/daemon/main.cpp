@@ -31,6 +31,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <sys/stat.h>
+#include <unistd.h>
 
 namespace kelvo {
 namespace {
@@ -40,6 +41,7 @@ constexpr const char* kLockPath = "/run/kelvod/lock";
 /// The one place that knows on which platform the daemon runs.
 Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
     Platform platform;
+    platform.processIdentifier = ::getpid();
     platform.clock = std::make_shared<SystemClock>();
     platform.random = std::make_shared<KernelRandom>();
     platform.mainQueue = std::make_shared<MainQueue>(*platform.clock);
@@ -66,6 +68,11 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
         std::make_shared<LoadedMediaService>(platform.fileSystem, LoadedMediaService::usualFolders());
     platform.ipc = std::make_shared<SocketTransport>(root, platform.bundles);
     platform.alerts = ShellAlerts::create(platform.ipc);
+    platform.photoLibrary = std::make_shared<MissingPhotoLibrary>();
+    platform.sounds = std::make_shared<SilentSystemSounds>();
+    platform.applications = std::make_shared<UnwatchedApplications>();
+    platform.accessibility = std::make_shared<UnreadScreen>();
+    platform.inCarDisplay = std::make_shared<NoInCarDisplay>();
     return platform;
 }
 

@@ -8,7 +8,7 @@
 namespace kelvo {
 
 /// The broadcast settings that a client sends when it sets up a broadcast. Caller's thread.
-class KVBroadcastConfiguration {
+class KVBroadcastConfiguration : public ObjectHandle {
   public:
     /// The length of one movie clip, in seconds.
     double clipDuration() const { return clipDuration_; }

@@ -25,6 +25,11 @@ KVClientProxy::~KVClientProxy() {
     connection->invalidate();
 }
 
+std::int32_t KVClientProxy::processIdentifier() const {
+    const IPCConnectionRef client = connection();
+    return client ? client->processIdentifier() : 0;
+}
+
 void KVClientProxy::updateScreenRecordingState() {
     KVLog("KVClientProxy:updateScreenRecordingState");
 }

@@ -18,6 +18,8 @@ class KVClientProxy : public KVClientProxyBase {
     IPCConnectionRef connection() const { return connection_.copy(); }
     void setConnection(IPCConnectionRef connection) { connection_.set(std::move(connection)); }
 
+    std::int32_t processIdentifier() const override;
+
     /// Only logs: an application knows the state of its own recording.
     void updateScreenRecordingState() override;
     void updateBroadcastServiceInfo(const Dictionary& serviceInfo) override;

@@ -50,6 +50,9 @@ class KVClientProtocol {
 /// The type through which sessions hold their client, be it one application or all privileged ones at once.
 class KVClientProxyBase : public KVClientProtocol {
   public:
+    /// The client's process; 0 when it is not one alone, or gone.
+    virtual std::int32_t processIdentifier() const { return 0; }
+
     /// Ends the connections of one process. A proxy of a single client has nothing to do here.
     virtual void resetConnectionWithProcessIdentifier(std::int32_t processIdentifier) {
         static_cast<void>(processIdentifier);

@@ -25,6 +25,10 @@ class DeviceProperties {
 
     /// The main screen's native orientation; 0 is portrait, none is unknown.
     virtual std::optional<float> mainScreenOrientation() = 0;
+
+    /// Whether the law of the region where the device is sold wants recordings to be heard
+    /// ("RegionalBehaviorShutterClick"); none when nothing is said about it.
+    virtual std::optional<bool> regionalBehaviorShutterClick() = 0;
 };
 
 }  // namespace kelvo

@@ -2,7 +2,9 @@
 
 #include "base/Clock.h"
 #include "base/MainQueue.h"
+#include "platform/Accessibility.h"
 #include "platform/AnalyticsSink.h"
+#include "platform/ApplicationState.h"
 #include "platform/AudioService.h"
 #include "platform/BulletinService.h"
 #include "platform/Bundles.h"
@@ -11,8 +13,10 @@
 #include "platform/DisplayLayout.h"
 #include "platform/FileSystem.h"
 #include "platform/IPC.h"
+#include "platform/InCarDisplay.h"
 #include "platform/MediaService.h"
 #include "platform/NotificationCenter.h"
+#include "platform/PhotoLibrary.h"
 #include "platform/Preferences.h"
 #include "platform/Random.h"
 #include "platform/RenderServer.h"
@@ -20,8 +24,10 @@
 #include "platform/ScreenCapture.h"
 #include "platform/StoragePurgeService.h"
 #include "platform/SystemAlert.h"
+#include "platform/SystemSounds.h"
 #include "platform/TextFolding.h"
 
+#include <cstdint>
 #include <memory>
 
 namespace kelvo {
@@ -30,6 +36,8 @@ namespace kelvo {
 /// constructors. Nothing above this layer reads the world in any other way. Services are destroyed in reverse
 /// order, so one may rely on those above it.
 struct Platform {
+    /// The process identifier of the daemon itself.
+    std::int32_t processIdentifier = 0;
     std::shared_ptr<Clock> clock;
     std::shared_ptr<Random> random;
     std::shared_ptr<MainQueue> mainQueue;
@@ -53,6 +61,11 @@ struct Platform {
     std::shared_ptr<SystemAlertService> alerts;
     std::shared_ptr<IPCTransport> ipc;
     std::shared_ptr<MediaService> media;
+    std::shared_ptr<PhotoLibrary> photoLibrary;
+    std::shared_ptr<SystemSounds> sounds;
+    std::shared_ptr<ApplicationStateSource> applications;
+    std::shared_ptr<Accessibility> accessibility;
+    std::shared_ptr<InCarDisplay> inCarDisplay;
 };
 
 }  // namespace kelvo

@@ -9,6 +9,14 @@
 
 namespace kelvo {
 
+/// Told what the system does to the registered styles. On a thread of the status bar's service.
+class StatusBarCoordinatorDelegate {
+  public:
+    virtual ~StatusBarCoordinatorDelegate() = default;
+    /// The system withdrew the styles.
+    virtual void statusBarCoordinatorInvalidatedRegistrationWithError(const OptionalError& error) = 0;
+};
+
 /// The right to style the status bar for one process. Any thread.
 class StatusBarStyleAssertion {
   public:

@@ -64,34 +64,40 @@ class KVRecordingSession : public RecordingSession,
 
     // Configuration, before the start.
     std::vector<std::uint32_t> contextIDs() const { return contextIDs_.copy(); }
-    void setContextIDs(std::vector<std::uint32_t> contextIDs) { contextIDs_.set(std::move(contextIDs)); }
+    void setContextIDs(std::vector<std::uint32_t> contextIDs) override {
+        contextIDs_.set(std::move(contextIDs));
+    }
     /// The capture size: the size last set, limited so that its longer side is no longer than the device
     /// records, unless the preference "KVFullResCapture" lifts that.
     Size windowSize() const { return windowSize_.copy(); }
     Size originalWindowSize() const { return originalWindowSize_.copy(); }
-    void setWindowSize(const Size& size);
+    void setWindowSize(const Size& size) override;
     bool microphoneEnabled() const override { return microphoneEnabled_; }
     /// Switches the microphone, also while recording. Off means silence, the tap goes on.
     void setMicrophoneEnabled(bool enabled) override;
     bool microphoneEnabledPersistent() const override { return microphoneEnabledPersistent_; }
     void setMicrophoneEnabledPersistent(bool enabled) override { microphoneEnabledPersistent_ = enabled; }
-    void setSystemRecording(bool systemRecording) { systemRecording_ = systemRecording; }
-    bool isCapturing() const { return captureRecording_; }
-    void setCaptureRecording(bool captureRecording) { captureRecording_ = captureRecording; }
-    void setBroadcasting(bool broadcasting) { isBroadcasting_ = broadcasting; }
+    void setSystemRecording(bool systemRecording) override { systemRecording_ = systemRecording; }
+    bool isCapturing() const override { return captureRecording_; }
+    void setCaptureRecording(bool captureRecording) override { captureRecording_ = captureRecording; }
+    void setBroadcasting(bool broadcasting) override { isBroadcasting_ = broadcasting; }
     bool hasUserConsentForCamera() const override { return hasUserConsentForCamera_; }
     void setHasUserConsentForCamera(bool consent) override { hasUserConsentForCamera_ = consent; }
     bool hasUserConsentForMicrophone() const override { return hasUserConsentForMicrophone_; }
     void setHasUserConsentForMicrophone(bool consent) override { hasUserConsentForMicrophone_ = consent; }
     /// An in-app session taps the microphone only with the daemon's own consent.
     bool daemonUserConsentForMicrophone() const { return daemonUserConsentForMicrophone_; }
-    void setDaemonUserConsentForMicrophone(bool consent) { daemonUserConsentForMicrophone_ = consent; }
+    void setDaemonUserConsentForMicrophone(bool consent) override {
+        daemonUserConsentForMicrophone_ = consent;
+    }
     void setClientProxy(ClientProxyRef proxy) override { clientProxy_.set(std::move(proxy)); }
-    void setDelegate(std::weak_ptr<KVRecordingSessionDelegate> delegate) {
+    void setDelegate(std::weak_ptr<KVRecordingSessionDelegate> delegate) override {
         delegate_.set(std::move(delegate));
     }
     /// A session with a link broadcasts through it; none ends that.
-    std::shared_ptr<BroadcastExtensionLink> broadcastExtension() const { return broadcastExtension_.copy(); }
+    std::shared_ptr<BroadcastExtensionLink> broadcastExtension() const override {
+        return broadcastExtension_.copy();
+    }
     void setBroadcastExtension(std::shared_ptr<BroadcastExtensionLink> link) {
         broadcastExtension_.set(std::move(link));
     }
@@ -100,7 +106,7 @@ class KVRecordingSession : public RecordingSession,
     std::shared_ptr<const KVBroadcastConfiguration> broadcastConfiguration() const {
         return broadcastConfiguration_.copy();
     }
-    void setBroadcastConfiguration(std::shared_ptr<const KVBroadcastConfiguration> configuration) {
+    void setBroadcastConfiguration(std::shared_ptr<const KVBroadcastConfiguration> configuration) override {
         broadcastConfiguration_.set(std::move(configuration));
     }
     long broadcastFragmentIndex() const { return broadcastFragmentIndex_; }
@@ -108,11 +114,19 @@ class KVRecordingSession : public RecordingSession,
     SerialQueue& broadcastServiceInfoQueue() { return broadcastServiceInfoQueue_; }
     /// The process whose sound is recorded; below 1 means none.
     std::int32_t frontmostPIDForAudioTap() const { return frontmostPIDForAudioTap_; }
-    void setFrontmostPIDForAudioTap(std::int32_t processIdentifier) {
+    void setFrontmostPIDForAudioTap(std::int32_t processIdentifier) override {
         frontmostPIDForAudioTap_ = processIdentifier;
     }
-    std::optional<Dictionary> extensionInfo() const { return extensionInfo_.copy(); }
-    std::optional<URL> interruptedMovieURL() const { return interruptedMovieURL_.copy(); }
+    std::optional<Dictionary> extensionInfo() const override { return extensionInfo_.copy(); }
+    std::optional<URL> interruptedMovieURL() const override { return interruptedMovieURL_.copy(); }
+
+    /// What the client wants its extension to know.
+    std::optional<Dictionary> broadcastUserInfo() const { return broadcastUserInfo_.copy(); }
+    /// Takes the settings over and fails: there is no link to extensions.
+    OptionalError enableBroadcastWithExtension(const Value& extension, BroadcastProcessMode processMode,
+                                               const Dictionary& userInfo,
+                                               const std::shared_ptr<IPCEndpoint>& listenerEndpoint) override;
+    void disableBroadcast() override;
 
     // State.
     bool isPaused() const override { return paused_; }
@@ -140,22 +154,22 @@ class KVRecordingSession : public RecordingSession,
 
     // Life cycle.
     /// Begins a recording. `completion`, which may be none, runs when capturing has begun.
-    void startSessionWithHandler(CompletionHandler completion);
+    void startSessionWithHandler(CompletionHandler completion) override;
     void pauseSession() override;
     /// Goes on with a window of the client's. Nothing unless paused. The time of the pause is cut out.
-    void resumeSessionWithContextID(std::uint32_t contextID);
+    void resumeSessionWithContextID(std::uint32_t contextID) override;
     /// Stops a running recording; with `notify` the delegate hears of it.
     void stopRecordingWithNotification(bool notify, const OptionalError& error);
     void stopAllCapture();
 
     // Environment.
-    void frontmostApplicationDidChange(std::int32_t processIdentifier);
-    void frontmostApplicationWasTerminated(std::int32_t processIdentifier);
-    void frontmostApplicationDidEnterBackground(std::int32_t processIdentifier);
-    void updateProcessIDForAudioCaptureWithPID(std::int32_t processIdentifier);
+    void frontmostApplicationDidChange(std::int32_t processIdentifier) override;
+    void frontmostApplicationWasTerminated(std::int32_t processIdentifier) override;
+    void frontmostApplicationDidEnterBackground(std::int32_t processIdentifier) override;
+    void updateProcessIDForAudioCaptureWithPID(std::int32_t processIdentifier) override;
     void updateBundleIdForFirstForegroundApp();
-    void clientApplicationDidEnterBackground();
-    void clientApplicationDidEnterForeground();
+    void clientApplicationDidEnterBackground() override;
+    void clientApplicationDidEnterForeground() override;
 
     /// Notes which camera was used: 1 is the back one, 2 the front one.
     void sessionReportCameraUsage(std::uint32_t cameraPosition);
@@ -289,6 +303,7 @@ class KVRecordingSession : public RecordingSession,
 
     Guarded<std::optional<Dictionary>> extensionInfo_;
     Guarded<std::shared_ptr<BroadcastExtensionLink>> broadcastExtension_;
+    Guarded<std::optional<Dictionary>> broadcastUserInfo_;
     std::atomic<BroadcastProcessMode> broadcastProcessMode_{BroadcastProcessMode::movieClips};
     Guarded<std::shared_ptr<const KVBroadcastConfiguration>> broadcastConfiguration_;
     std::atomic<long> broadcastFragmentIndex_{0};

@@ -70,6 +70,9 @@ class FakeClientProxy : public KVClientProxyBase {
         note("resetConnectionWithProcessIdentifier");
     }
 
+    std::int32_t processIdentifier() const override { return process; }
+    std::int32_t process = 0;
+
     /// The names of the messages so far, in order; what a message brought is kept before it is named.
     std::vector<std::string> messages() const { return messages_.copy(); }
 

@@ -41,12 +41,85 @@ class FakeRecordingSession : public RecordingSession {
         paused = true;
     }
 
+    bool isCapturing() const override { return capturing; }
+    std::optional<Dictionary> extensionInfo() const override { return extension; }
+    std::optional<URL> interruptedMovieURL() const override { return interruptedMovie; }
+    std::shared_ptr<BroadcastExtensionLink> broadcastExtension() const override { return nullptr; }
+
+    void setBroadcasting(bool isBroadcasting) override {
+        note("setBroadcasting");
+        broadcasting = isBroadcasting;
+    }
+    void setSystemRecording(bool isSystemRecording) override {
+        note("setSystemRecording");
+        systemRecording = isSystemRecording;
+    }
+    void setContextIDs(std::vector<std::uint32_t> identifiers) override {
+        note("setContextIDs");
+        contextIDs = std::move(identifiers);
+    }
+    void setWindowSize(const Size& size) override {
+        note("setWindowSize");
+        windowSize = size;
+    }
+    void setDelegate(std::weak_ptr<KVRecordingSessionDelegate> owner) override {
+        note("setDelegate");
+        delegate = std::move(owner);
+    }
+    void setCaptureRecording(bool isCapturing) override {
+        note("setCaptureRecording");
+        capturing = isCapturing;
+    }
+    void setDaemonUserConsentForMicrophone(bool consent) override { daemonMicrophoneConsent = consent; }
+    void setFrontmostPIDForAudioTap(std::int32_t process) override {
+        note("setFrontmostPIDForAudioTap");
+        tappedProcess = process;
+    }
+    void setBroadcastConfiguration(std::shared_ptr<const KVBroadcastConfiguration> set) override {
+        note("setBroadcastConfiguration");
+        broadcastConfiguration = std::move(set);
+    }
+    OptionalError enableBroadcastWithExtension(const Value& enabled, BroadcastProcessMode mode,
+                                               const Dictionary& info,
+                                               const std::shared_ptr<IPCEndpoint>& endpoint) override {
+        note("enableBroadcast");
+        enabledExtension = enabled;
+        broadcastProcessMode = mode;
+        broadcastUserInfo = info;
+        listenerEndpoint = endpoint;
+        return broadcastError;
+    }
+    void disableBroadcast() override { note("disableBroadcast"); }
+    void startSessionWithHandler(std::function<void()> completion) override {
+        note("startSession");
+        start = std::move(completion);
+    }
+    void resumeSessionWithContextID(std::uint32_t contextID) override {
+        note("resumeSession");
+        contextIDs = {contextID};
+        paused = false;
+    }
+    void updateProcessIDForAudioCaptureWithPID(std::int32_t process) override {
+        note("updateProcessIDForAudioCapture");
+        tappedProcess = process;
+    }
+
+    void clientApplicationDidEnterBackground() override { note("clientApplicationDidEnterBackground"); }
+    void clientApplicationDidEnterForeground() override { note("clientApplicationDidEnterForeground"); }
+    void frontmostApplicationDidChange(std::int32_t) override { note("frontmostApplicationDidChange"); }
+    void frontmostApplicationWasTerminated(std::int32_t) override {
+        note("frontmostApplicationWasTerminated");
+    }
+    void frontmostApplicationDidEnterBackground(std::int32_t) override {
+        note("frontmostApplicationDidEnterBackground");
+    }
+
     void setRecording(bool isRecording) override { recording = isRecording; }
     void setPaused(bool isPaused) override { paused = isPaused; }
-    void setExtensionInfo(std::optional<Dictionary> info) override { extensionInfo = std::move(info); }
+    void setExtensionInfo(std::optional<Dictionary> info) override { extension = std::move(info); }
     void setInterruptedMovieURL(std::optional<URL> movieURL) override {
         note("setInterruptedMovieURL");
-        interruptedMovieURL = std::move(movieURL);
+        interruptedMovie = std::move(movieURL);
     }
 
     void finishSessionWithHandler(MovieHandler completion) override {
@@ -68,6 +141,8 @@ class FakeRecordingSession : public RecordingSession {
     void notifyRecordingMayBeStopped() override { note("notifyRecordingMayBeStopped"); }
     void notifyRecordingResumed() override { note("notifyRecordingResumed"); }
 
+    /// Capturing has begun.
+    void completeStart() { std::exchange(start, nullptr)(); }
     /// Ends the finish that was asked for, with this outcome.
     void completeFinish(const std::optional<URL>& movieURL, const OptionalError& error) {
         std::exchange(finish, nullptr)(movieURL, error);
@@ -86,13 +161,29 @@ class FakeRecordingSession : public RecordingSession {
     /// What `setClientProxy` stored; until then the client is `client`.
     ClientProxyRef connectedClient;
     std::shared_ptr<FakeClientProxy> client = std::make_shared<FakeClientProxy>();
-    std::optional<Dictionary> extensionInfo;
-    std::optional<URL> interruptedMovieURL;
+    std::optional<Dictionary> extension;
+    std::optional<URL> interruptedMovie;
+
+    // What a start set.
+    bool capturing = false;
+    bool daemonMicrophoneConsent = false;
+    std::vector<std::uint32_t> contextIDs;
+    Size windowSize;
+    std::weak_ptr<KVRecordingSessionDelegate> delegate;
+    std::int32_t tappedProcess = 0;
+    std::shared_ptr<const KVBroadcastConfiguration> broadcastConfiguration;
+    Value enabledExtension;
+    BroadcastProcessMode broadcastProcessMode = BroadcastProcessMode::movieClips;
+    Dictionary broadcastUserInfo;
+    std::shared_ptr<IPCEndpoint> listenerEndpoint;
+    /// What enabling the broadcast answers.
+    OptionalError broadcastError;
 
     /// What was asked of the session, in order.
     std::vector<std::string> requests;
     std::vector<Clip> clips;
-    /// What waits for `completeFinish` and `completeCleanup`.
+    /// What waits for `completeStart`, `completeFinish` and `completeCleanup`.
+    std::function<void()> start;
     MovieHandler finish;
     std::function<void()> cleanup;
     /// When set, is told each request as well.

@@ -27,10 +27,16 @@ SimulatedDevice::SimulatedDevice()
       bulletins(std::make_shared<SimulatedBulletins>()),
       alerts(std::make_shared<SimulatedAlerts>(faults)),
       ipc(std::make_shared<SimulatedIPC>()),
-      media(std::make_shared<SimulatedMedia>(fileSystem, faults)) {}
+      media(std::make_shared<SimulatedMedia>(fileSystem, faults)),
+      photoLibrary(std::make_shared<SimulatedPhotoLibrary>(fileSystem, faults)),
+      sounds(std::make_shared<SimulatedSystemSounds>()),
+      applications(std::make_shared<SimulatedApplications>()),
+      accessibility(std::make_shared<SimulatedAccessibility>()),
+      inCarDisplay(std::make_shared<SimulatedInCarDisplay>(faults)) {}
 
 Platform SimulatedDevice::platform() const {
     Platform platform;
+    platform.processIdentifier = kProcessIdentifier;
     platform.clock = clock;
     platform.random = random;
     platform.mainQueue = mainQueue;
@@ -54,13 +60,18 @@ Platform SimulatedDevice::platform() const {
     platform.alerts = alerts;
     platform.ipc = ipc;
     platform.media = media;
+    platform.photoLibrary = photoLibrary;
+    platform.sounds = sounds;
+    platform.applications = applications;
+    platform.accessibility = accessibility;
+    platform.inCarDisplay = inCarDisplay;
     return platform;
 }
 
 void SimulatedDevice::settle() {
     do {
         GlobalQueue::drain();
-    } while (mainQueue->runUntilIdle() > 0 || ipc->settle());
+    } while (mainQueue->runUntilIdle() > 0 || ipc->settle() || applications->settle());
 }
 
 void SimulatedDevice::advance(std::chrono::nanoseconds interval) {

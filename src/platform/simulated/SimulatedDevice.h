@@ -2,6 +2,7 @@
 
 #include "platform/Platform.h"
 #include "platform/simulated/SimulatedAnalytics.h"
+#include "platform/simulated/SimulatedApplications.h"
 #include "platform/simulated/SimulatedAudio.h"
 #include "platform/simulated/SimulatedBundles.h"
 #include "platform/simulated/SimulatedClock.h"
@@ -11,6 +12,7 @@
 #include "platform/simulated/SimulatedIPC.h"
 #include "platform/simulated/SimulatedMedia.h"
 #include "platform/simulated/SimulatedNotifications.h"
+#include "platform/simulated/SimulatedPhotoLibrary.h"
 #include "platform/simulated/SimulatedScreen.h"
 #include "platform/simulated/SimulatedSettings.h"
 #include "platform/simulated/SimulatedShell.h"
@@ -40,6 +42,9 @@ namespace kelvo {
 class SimulatedDevice {
   public:
     SimulatedDevice();
+
+    /// What `platform().processIdentifier` is.
+    static constexpr std::int32_t kProcessIdentifier = 77;
 
     /// The services to hand to the logic.
     Platform platform() const;
@@ -104,6 +109,11 @@ class SimulatedDevice {
     const std::shared_ptr<SimulatedAlerts> alerts;
     const std::shared_ptr<SimulatedIPC> ipc;
     const std::shared_ptr<SimulatedMedia> media;
+    const std::shared_ptr<SimulatedPhotoLibrary> photoLibrary;
+    const std::shared_ptr<SimulatedSystemSounds> sounds;
+    const std::shared_ptr<SimulatedApplications> applications;
+    const std::shared_ptr<SimulatedAccessibility> accessibility;
+    const std::shared_ptr<SimulatedInCarDisplay> inCarDisplay;
 };
 
 }  // namespace kelvo

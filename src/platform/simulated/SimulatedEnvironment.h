@@ -2,10 +2,15 @@
 
 #include "base/Guarded.h"
 #include "base/MainQueue.h"
+#include "platform/Accessibility.h"
 #include "platform/CallObserver.h"
 #include "platform/DisplayLayout.h"
+#include "platform/InCarDisplay.h"
 #include "platform/RestrictionsProfile.h"
+#include "platform/SystemSounds.h"
+#include "platform/simulated/SimulatedFaults.h"
 
+#include <atomic>
 #include <map>
 #include <vector>
 
@@ -64,6 +69,44 @@ class SimulatedDisplayLayout : public DisplayLayoutService {
     };
     std::shared_ptr<Shared> shared_ = std::make_shared<Shared>();
     Guarded<std::shared_ptr<DisplayLayoutMonitor>> lastMonitor_;
+};
+
+/// Remembers which sounds were to be heard. Thread-safe.
+class SimulatedSystemSounds : public SystemSounds {
+  public:
+    void playSystemSound(std::uint32_t soundID) override {
+        played_.with([&](auto& all) { all.push_back(soundID); });
+    }
+    std::vector<std::uint32_t> played() const { return played_.copy(); }
+
+  private:
+    Guarded<std::vector<std::uint32_t>> played_;
+};
+
+/// A screen reader that a test switches. Thread-safe.
+class SimulatedAccessibility : public Accessibility {
+  public:
+    bool isScreenReaderRunning() override { return isScreenReaderRunning_; }
+    void setScreenReaderRunning(bool isRunning) { isScreenReaderRunning_ = isRunning; }
+
+  private:
+    std::atomic<bool> isScreenReaderRunning_{false};
+};
+
+/// A car that a test drives. Fails when "InCarDisplay.isActive" was ordered to. Thread-safe.
+class SimulatedInCarDisplay : public InCarDisplay {
+  public:
+    explicit SimulatedInCarDisplay(std::shared_ptr<SimulatedFaults> faults) : faults_(std::move(faults)) {}
+
+    Result<bool> isActive() override {
+        if (const OptionalError fault = faults_->take("InCarDisplay.isActive")) return *fault;
+        return isActive_.load();
+    }
+    void setActive(bool isActive) { isActive_ = isActive; }
+
+  private:
+    const std::shared_ptr<SimulatedFaults> faults_;
+    std::atomic<bool> isActive_{false};
 };
 
 }  // namespace kelvo

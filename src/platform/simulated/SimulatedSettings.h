@@ -48,17 +48,20 @@ class SimulatedDeviceProperties : public DeviceProperties {
     bool isInternalBuild() override { return isInternalBuild_; }
     std::int64_t chipIdentifier() override { return chipIdentifier_; }
     std::optional<float> mainScreenOrientation() override { return orientation_.copy(); }
+    std::optional<bool> regionalBehaviorShutterClick() override { return shutterClick_.copy(); }
 
     void setIdiom(DeviceIdiom idiom) { idiom_ = idiom; }
     void setInternalBuild(bool isInternal) { isInternalBuild_ = isInternal; }
     void setChipIdentifier(std::int64_t identifier) { chipIdentifier_ = identifier; }
     void setMainScreenOrientation(std::optional<float> orientation) { orientation_.set(orientation); }
+    void setRegionalBehaviorShutterClick(std::optional<bool> isWanted) { shutterClick_.set(isWanted); }
 
   private:
     std::atomic<DeviceIdiom> idiom_{DeviceIdiom::phone};
     std::atomic<bool> isInternalBuild_{false};
     std::atomic<std::int64_t> chipIdentifier_{0};
     Guarded<std::optional<float>> orientation_{std::optional<float>(0.0F)};
+    Guarded<std::optional<bool>> shutterClick_;
 };
 
 /// Bytes that look random and are the same in every run. Thread-safe.

@@ -5,8 +5,10 @@
 #include "support/FakeRecordingSession.h"
 #include "support/LogRecorder.h"
 
+#include <atomic>
 #include <memory>
 #include <string>
+#include <thread>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -22,8 +24,22 @@ class ManagerFixture : public testing::Test {
     /// What a session was never asked to complete may hold the session itself.
     ~ManagerFixture() override {
         for (const auto& made : sessions_) {
+            made->start = nullptr;
             made->finish = nullptr;
             made->cleanup = nullptr;
+        }
+        device.settle();
+        manager.reset();
+        drainAlerts();
+    }
+
+    /// Takes every alert that nobody answered off the screen, and waits until no more come.
+    void drainAlerts() {
+        std::atomic<bool> isDrained = false;
+        KVRecordingManager::kelvoAlertQueue().async([&] { isDrained = true; });
+        while (!isDrained) {
+            device.answerAlert(SystemAlertResponse::cancelled);
+            std::this_thread::yield();
         }
     }
 

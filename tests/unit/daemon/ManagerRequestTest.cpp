@@ -57,17 +57,6 @@ TEST_F(ManagerRequestTest, DisconnectedClientWithoutABundleStopsNothing) {
     EXPECT_THAT(recording->requests, IsEmpty());
 }
 
-TEST_F(ManagerRequestTest, StartIsAnsweredWithAnErrorOfTheDomain) {
-    std::vector<std::int64_t> codes;
-    const auto answered = [&](const OptionalError& error, bool microphone, bool camera) {
-        codes.push_back(error ? error->code() : 0);
-        EXPECT_FALSE(microphone || camera);
-    };
-    manager->startRecordingWindowLayerContextIDs({}, {}, true, true, false, false, false, nullptr, answered);
-    manager->startRecordingWindowLayerContextIDs({}, {}, true, true, false, false, false, nullptr, nullptr);
-    EXPECT_THAT(codes, ElementsAre(-5803));
-}
-
 TEST_F(ManagerRequestTest, WhatIsNotOfferedYetIsAnsweredOrLogged) {
     std::vector<std::int64_t> codes;
     manager->setupBroadcastWithHostBundleID("", "", {}, {},
@@ -77,13 +66,9 @@ TEST_F(ManagerRequestTest, WhatIsNotOfferedYetIsAnsweredOrLogged) {
         codes.push_back(e->code());
     });
     EXPECT_THAT(codes, ElementsAre(-5800, -5800));
-    manager->resumeRecordingWithWindowLayerContextID(1);
-    manager->updateProcessIDForAudioCaptureWithPID(1);
     manager->setBroadcastURL(URL("x"));
     manager->reportCameraUsage(1);
-    for (const char* request :
-         {"resumeRecordingWithWindowLayerContextID", "updateProcessIDForAudioCaptureWithPID",
-          "setBroadcastURL", "reportCameraUsage"}) {
+    for (const char* request : {"setBroadcastURL", "reportCameraUsage"}) {
         EXPECT_EQ(log.count("KVRecordingManager: " + std::string(request) + " is not offered yet"), 1U);
     }
 }
@@ -127,11 +112,47 @@ TEST_F(ManagerRequestTest, StopOfACallerWithoutASessionAnswersNothing) {
     EXPECT_EQ(answers, 1);
 }
 
-TEST_F(ManagerRequestTest, SaveOfAMovieIsAnsweredWithItsFailure) {
-    std::vector<std::int64_t> codes;
-    manager->saveVideoToCameraRoll(URL("file:///m"),
-                                   [&](const OptionalError& error) { codes.push_back(error->code()); });
-    EXPECT_THAT(codes, ElementsAre(-5812));
+TEST_F(ManagerRequestTest, ResumeWithTheCallersWindowGoesOn) {
+    const auto found = recordingSession("com.example.app");
+    device.renderServer->setProcessOfContext(7, 10);
+    manager->resumeRecordingWithWindowLayerContextID(7);
+    EXPECT_THAT(found->requests, IsEmpty()) << "it is not paused";
+    found->paused = true;
+    manager->resumeRecordingWithWindowLayerContextID(7);
+    EXPECT_THAT(found->requests, ElementsAre("resumeSession"));
+    EXPECT_THAT(found->contextIDs, ElementsAre(7U));
+    EXPECT_EQ(log.count("KVRecordingManager: resumeRecording"), 2U);
+}
+
+TEST_F(ManagerRequestTest, ResumeWithAForeignWindowStopsThePausedRecording) {
+    const auto found = recordingSession("com.example.app");
+    manager->resumeRecordingWithWindowLayerContextID(7);
+    EXPECT_THAT(found->requests, IsEmpty()) << "it is not paused";
+    found->paused = true;
+    manager->resumeRecordingWithWindowLayerContextID(7);
+    found->completeFinish(URL("file:///m"), std::nullopt);
+    EXPECT_THAT(stopCodes(*found), ElementsAre(-5816));
+    EXPECT_EQ(found->client->stops.copy().front().movieURL, URL("file:///m"));
+}
+
+TEST_F(ManagerRequestTest, AudioProcessIsChangedForPrivilegedClientsOnly) {
+    const auto found = recordingSession("com.example.app");
+    manager->updateProcessIDForAudioCaptureWithPID(5);
+    EXPECT_THAT(found->requests, IsEmpty());
+    device.ipc->setCurrentConnection(
+        std::make_shared<SimulatedConnection>(10, Dictionary{{"com.quillon.private.kelvo-kit", true}}));
+    manager->updateProcessIDForAudioCaptureWithPID(5);
+    EXPECT_EQ(found->tappedProcess, 5);
+    found->recording = false;
+    manager->updateProcessIDForAudioCaptureWithPID(6);
+    EXPECT_EQ(found->tappedProcess, 5);
+    EXPECT_TRUE(log.contains("KVRecordingManager: updateProcessIDForAudioCaptureWithPID:6"));
+}
+
+TEST_F(ManagerRequestTest, ClientThatGoesIsObservedNoLonger) {
+    manager->applicationStateMonitor()->addObserver(session("com.example.app"), 10);
+    manager->applicationDisconnectedWithBundleID("com.example.app", 10);
+    EXPECT_EQ(manager->applicationStateMonitor()->observersCount(), 0U);
 }
 
 TEST_F(ManagerRequestTest, PauseReachesOnlyARunningInAppRecording) {

@@ -43,12 +43,12 @@ class ManagerStopTest : public test::ManagerFixture {
 TEST_F(ManagerStopTest, ResetClearsTheSessionsState) {
     const auto recording = recordingSession("a");
     recording->paused = true;
-    recording->extensionInfo = Dictionary{{"k", 1}};
+    recording->extension = Dictionary{{"k", 1}};
     manager->resetStatesForSession(recording);
     EXPECT_TRUE(log.contains("KVRecordingManager:resetStatesForSession:"));
     EXPECT_FALSE(recording->recording);
     EXPECT_FALSE(recording->paused);
-    EXPECT_FALSE(recording->extensionInfo);
+    EXPECT_FALSE(recording->extension);
 }
 
 TEST_F(ManagerStopTest, PreparationForgetsTheBroadcastsImages) {
@@ -117,13 +117,6 @@ TEST_F(ManagerStopTest, StoppedReportReachesTheClient) {
 TEST_F(ManagerStopTest, FailedSaveIsLogged) {
     manager->failedToSaveRecordingForRecordingSession(session("a"), KVError("domain", -5812));
     EXPECT_TRUE(log.contains("KVRecordingManager:saveVideoToCameraRoll: Video saved to camera roll failed"));
-}
-
-TEST_F(ManagerStopTest, SaveWithoutAPhotoLibraryIsAnsweredWithItsError) {
-    OptionalError answer;
-    manager->saveVideoToCameraRoll(URL::file("/a.mp4"), [&](const OptionalError& error) { answer = error; });
-    ASSERT_TRUE(answer);
-    EXPECT_EQ(answer->code(), -5812);
 }
 
 }  // namespace

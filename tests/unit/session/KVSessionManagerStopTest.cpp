@@ -250,7 +250,7 @@ TEST_F(KVSessionManagerStopTest, InterruptionFinishesEveryOtherRecording) {
     EXPECT_THAT(diary, ElementsAre("com.example.b's client: recordingDidStopWithError",
                                    "com.example.b: setInterruptedMovieURL", "reset com.example.b"));
     EXPECT_EQ(log.count("interrupted session"), 1U);
-    EXPECT_EQ(other->interruptedMovieURL, kMovie);
+    EXPECT_EQ(other->interruptedMovie, kMovie);
     EXPECT_THAT(other->client->stops.copy(), ElementsAre(test::FakeClientProxy::Stop{kFailure, kMovie}));
 }
 

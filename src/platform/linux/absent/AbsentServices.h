@@ -1,10 +1,15 @@
 #pragma once
 
+#include "platform/Accessibility.h"
 #include "platform/AnalyticsSink.h"
+#include "platform/ApplicationState.h"
 #include "platform/BulletinService.h"
 #include "platform/CallObserver.h"
 #include "platform/DisplayLayout.h"
+#include "platform/InCarDisplay.h"
+#include "platform/PhotoLibrary.h"
 #include "platform/RestrictionsProfile.h"
+#include "platform/SystemSounds.h"
 
 #include <cerrno>
 #include <memory>
@@ -66,6 +71,51 @@ class InvisibleBulletins : public BulletinService {
             return std::make_shared<Proxy>();
         }
     };
+};
+
+/// A device without a photo library.
+class MissingPhotoLibrary : public PhotoLibrary {
+  public:
+    Result<PhotoAsset> createVideoAsset(const URL&) override {
+        return KVError::posix(ENOSYS, "no photo library");
+    }
+    std::optional<PhotoAsset> assetWithLocalIdentifier(std::string_view) override { return std::nullopt; }
+    OptionalError deleteAsset(const PhotoAsset&) override { return KVError::posix(ENOENT, "no such asset"); }
+};
+
+/// A device that makes no sound of its own.
+class SilentSystemSounds : public SystemSounds {
+  public:
+    void playSystemSound(std::uint32_t) override {}
+};
+
+/// A device that knows nothing of its applications but that the user sees them, always.
+class UnwatchedApplications : public ApplicationStateSource {
+  public:
+    void setUpdateHandler(UpdateHandler) override {}
+    std::optional<ApplicationInformation> informationOfProcess(std::int32_t processIdentifier) override {
+        ApplicationInformation information;
+        information.state = kApplicationStateForeground;
+        information.processIdentifier = processIdentifier;
+        return information;
+    }
+    void informationOfApplication(std::string_view, InformationHandler handler) override {
+        if (handler) handler(std::nullopt);
+    }
+    std::int32_t stateOfApplication(std::string_view) override { return kApplicationStateForeground; }
+    std::optional<std::string> frontmostApplicationBundleIdentifier() override { return std::nullopt; }
+};
+
+/// A device that reads nothing to its user.
+class UnreadScreen : public Accessibility {
+  public:
+    bool isScreenReaderRunning() override { return false; }
+};
+
+/// A device that is in no car.
+class NoInCarDisplay : public InCarDisplay {
+  public:
+    Result<bool> isActive() override { return false; }
 };
 
 }  // namespace kelvo

@@ -50,6 +50,7 @@ DeviceFile::DeviceFile(const DeviceRoot& root, AskScreen askScreen) : askScreen_
     isInternalBuild_ = property(*file, "internalBuild", asBool).value_or(isInternalBuild_);
     chipIdentifier_ = property(*file, "chipIdentifier", asInteger).value_or(chipIdentifier_);
     orientation_.set(property(*file, "mainScreenOrientation", orientationFrom));
+    shutterClick_ = property(*file, "regionalBehaviorShutterClick", asBool);
 }
 
 std::optional<float> DeviceFile::mainScreenOrientation() {

@@ -12,7 +12,8 @@ namespace kelvo {
 /// Device properties from "/etc/kelvod/device.json" under the device root, read once:
 ///
 ///     { "idiom": "phone" | "tablet" | "desktop", "internalBuild": false,
-///       "chipIdentifier": 0, "mainScreenOrientation": 0.0 }
+///       "chipIdentifier": 0, "mainScreenOrientation": 0.0,
+///       "regionalBehaviorShutterClick": false }
 ///
 /// Without the file, or a key of it, the device is a desktop of unknown chip and not an internal build, and
 /// its screen is asked how it was built. What cannot be understood is logged and read as missing.
@@ -29,6 +30,7 @@ class DeviceFile : public DeviceProperties {
     bool isInternalBuild() override { return isInternalBuild_; }
     std::int64_t chipIdentifier() override { return chipIdentifier_; }
     std::optional<float> mainScreenOrientation() override;
+    std::optional<bool> regionalBehaviorShutterClick() override { return shutterClick_; }
 
   private:
     DeviceIdiom idiom_ = DeviceIdiom::desktop;
@@ -36,6 +38,7 @@ class DeviceFile : public DeviceProperties {
     std::int64_t chipIdentifier_ = 0;
     const AskScreen askScreen_;
     Guarded<std::optional<float>> orientation_;
+    std::optional<bool> shutterClick_;
 };
 
 }  // namespace kelvo

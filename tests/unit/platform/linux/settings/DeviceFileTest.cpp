@@ -25,6 +25,7 @@ TEST_F(DeviceFileTest, WithoutAFileTheDeviceIsADesktop) {
     EXPECT_FALSE(file.isInternalBuild());
     EXPECT_EQ(file.chipIdentifier(), 0);
     EXPECT_EQ(file.mainScreenOrientation(), std::nullopt);
+    EXPECT_EQ(file.regionalBehaviorShutterClick(), std::nullopt);
     EXPECT_TRUE(log.lines().empty());
 }
 
@@ -59,6 +60,7 @@ TEST_F(DeviceFileTest, EveryPropertyIsRead) {
     EXPECT_EQ(file.chipIdentifier(), 35168);
     EXPECT_EQ(file.mainScreenOrientation(), 1.5F);
     EXPECT_EQ(read(R"({"idiom":"phone"})").idiom(), DeviceIdiom::phone);
+    EXPECT_EQ(read(R"({"regionalBehaviorShutterClick":true})").regionalBehaviorShutterClick(), true);
 }
 
 TEST_F(DeviceFileTest, WrongPropertyIsLoggedAndKeepsItsDefault) {

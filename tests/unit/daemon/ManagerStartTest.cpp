@@ -1,0 +1,419 @@
+#include "ManagerFixture.h"
+
+#include <map>
+#include <thread>
+
+namespace kelvo {
+namespace {
+
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+constexpr const char* kUpdate = "updateScreenRecordingState";
+
+struct Answer {
+    std::int64_t code;
+    bool microphone;
+    bool camera;
+    friend bool operator==(const Answer&, const Answer&) = default;
+};
+
+/// Starts by the application "com.example.app", process 10, and by the system's shell, process 11.
+class ManagerStartTest : public test::ManagerFixture {
+  protected:
+    ManagerStartTest() {
+        createManager();
+        addApplication(10, "com.example.app", Dictionary());
+        addApplication(11, "com.quillon.plinth", {{"com.quillon.private.kelvo-kit", true}});
+        device.applications->change({kApplicationStateForeground, 10, true, "com.example.app"});
+        device.renderServer->setProcessOfContext(7, 10);
+        device.renderServer->setProcessOfContext(8, 11);
+        device.setLayout({1});
+        application = session("com.example.app");
+        application->client->process = 10;
+        system = session("com.quillon.plinth");
+        callFrom(10);
+    }
+
+    void addApplication(std::int32_t process, const std::string& bundle, const Dictionary& entitlements) {
+        SimulatedBundleContent content;
+        content.bundleIdentifier = bundle;
+        device.bundles->addBundle("/Applications/" + bundle, content);
+        device.bundles->addProcess(process, "/Applications/" + bundle + "/program");
+        connections[process] = std::make_shared<SimulatedConnection>(process, entitlements);
+    }
+    void callFrom(std::int32_t process) { device.ipc->setCurrentConnection(connections[process]); }
+
+    KVDaemonProtocol::StartHandler handler() {
+        return [this](const OptionalError& error, bool withMicrophone, bool withCamera) {
+            lastError = error;
+            answers.push_back({error ? error->code() : 0, withMicrophone, withCamera});
+        };
+    }
+    void request(bool systemRecording, const KVDaemonProtocol::StartHandler& answered) {
+        manager->startRecordingWindowLayerContextIDs(contexts, {108, 192}, microphone, camera, broadcast,
+                                                     systemRecording, capture, endpoint, answered);
+    }
+    void startInApp() { request(false, handler()); }
+    /// On the main queue, where the status bar lives.
+    void startSystem(const KVDaemonProtocol::StartHandler& answered) {
+        callFrom(11);
+        device.mainQueue->async([&] { request(true, answered); });
+        device.settle();
+    }
+    void startSystem() { startSystem(handler()); }
+    void accept() { device.answerAlert(SystemAlertResponse::alternateButton); }
+
+    /// The client was refused with `code`, saw (or did not see) its state change, and nothing was started.
+    void expectRefusal(const test::FakeRecordingSession& session, std::int64_t code, bool isUpdated) {
+        EXPECT_THAT(answers, ElementsAre(Answer{code, false, false}));
+        EXPECT_EQ(session.client->messages().size(), isUpdated ? 1U : 0U);
+        if (isUpdated) EXPECT_EQ(session.client->messages().front(), kUpdate);
+        EXPECT_FALSE(session.recording);
+        EXPECT_EQ(session.start, nullptr);
+    }
+
+    std::map<std::int32_t, IPCConnectionRef> connections;
+    std::shared_ptr<test::FakeRecordingSession> application;
+    std::shared_ptr<test::FakeRecordingSession> system;
+    std::vector<std::uint32_t> contexts{7};
+    bool microphone = true;
+    bool camera = false;
+    bool broadcast = false;
+    bool capture = false;
+    std::shared_ptr<IPCEndpoint> endpoint;
+    std::vector<Answer> answers;
+    OptionalError lastError;
+};
+
+TEST_F(ManagerStartTest, InAppRecordingIsConfiguredInOrderAndStarted) {
+    accept();
+    startInApp();
+    EXPECT_THAT(application->requests,
+                ElementsAre("disableBroadcast", "setBroadcasting", "setSystemRecording", "setContextIDs",
+                            "setWindowSize", "setDelegate", "setCaptureRecording",
+                            "setFrontmostPIDForAudioTap", "startSession"));
+    EXPECT_TRUE(application->recording);
+    EXPECT_FALSE(application->systemRecording || application->broadcasting || application->capturing);
+    EXPECT_TRUE(application->microphone);
+    EXPECT_THAT(application->contextIDs, ElementsAre(7U));
+    EXPECT_EQ(application->windowSize, (Size{108, 192}));
+    EXPECT_EQ(application->delegate.lock(), manager);
+    EXPECT_EQ(application->tappedProcess, 10);
+    EXPECT_THAT(answers, IsEmpty()) << "capturing has not begun";
+    application->completeStart();
+    EXPECT_THAT(answers, ElementsAre(Answer{0, true, false}));
+    EXPECT_THAT(application->client->messages(), IsEmpty());
+    EXPECT_EQ(manager->statusBarAssertion()->processIdentifier(), 0);
+    device.applications->change({kApplicationStateBackground, 10, false, "com.example.app"});
+    device.settle();
+    EXPECT_EQ(application->requests.back(), "clientApplicationDidEnterBackground");
+    for (const char* text : {"starting...", "broadcast disabled", "recording session started",
+                             "KVRecordingManager:startRecordingWindowLayerContextID:windowSize:"
+                             "microphoneEnabled:streaming:withHandler:"}) {
+        EXPECT_EQ(log.count(text), 1U) << text;
+    }
+}
+
+TEST_F(ManagerStartTest, CaptureIsHandedOn) {
+    capture = true;
+    accept();
+    startInApp();
+    EXPECT_TRUE(application->capturing);
+}
+
+TEST_F(ManagerStartTest, StartWithoutAHandlerStarts) {
+    accept();
+    request(false, nullptr);
+    application->completeStart();
+    EXPECT_TRUE(application->recording);
+}
+
+TEST_F(ManagerStartTest, SystemRecordingTapsTheFrontmostApplicationAndShowsItself) {
+    manager->currentExtensionDisplayName().set("Service");
+    startSystem();
+    EXPECT_THAT(device.alerts->shownAlerts(), IsEmpty());
+    EXPECT_TRUE(system->recording && system->systemRecording && system->microphone);
+    EXPECT_EQ(system->tappedProcess, 10);
+    const auto& bar = *manager->statusBarAssertion();
+    EXPECT_EQ(bar.processIdentifier(), SimulatedDevice::kProcessIdentifier);
+    EXPECT_EQ(bar.delegate(), manager);
+    EXPECT_EQ(bar.assertionDelegate(), manager);
+    EXPECT_EQ(bar.broadcastServiceName(), "Service");
+    EXPECT_FALSE(bar.broadcasting() || bar.isPaused());
+    system->completeStart();
+    EXPECT_THAT(answers, ElementsAre(Answer{0, true, false}));
+    EXPECT_THAT(system->client->messages(), ElementsAre(kUpdate));
+    device.applications->change({kApplicationStateForeground, 10, true, "com.example.app"});
+    device.settle();
+    EXPECT_EQ(system->requests.back(), "frontmostApplicationDidChange");
+}
+
+TEST_F(ManagerStartTest, StatusBarIsShownOnTheMainQueue) {
+    callFrom(11);
+    std::atomic<bool> isDone = false;
+    std::thread requests([&] {
+        request(true, nullptr);
+        isDone = true;
+    });
+    while (!isDone)
+        device.mainQueue->runUntilIdle();
+    requests.join();
+    EXPECT_EQ(manager->statusBarAssertion()->processIdentifier(), SimulatedDevice::kProcessIdentifier);
+}
+
+TEST_F(ManagerStartTest, PresentPreferenceHidesTheStatusBarOnInternalBuildsOnly) {
+    device.preferences->set("KVHideStatusBar", false);
+    startSystem();
+    EXPECT_NE(manager->statusBarAssertion()->processIdentifier(), 0) << "not an internal build";
+    system->recording = false;
+    manager->statusBarAssertion()->showDoubleHeightStatusBarWithPid(0);
+    device.device->setInternalBuild(true);
+    startSystem();
+    EXPECT_EQ(manager->statusBarAssertion()->processIdentifier(), 0);
+    EXPECT_EQ(log.count("KVRecordingManager: hideStatusBar=1"), 1U);
+}
+
+TEST_F(ManagerStartTest, ActiveInCarDisplayRefuses) {
+    device.inCarDisplay->setActive(true);
+    startInApp();
+    expectRefusal(*application, -5813, true);
+}
+
+TEST_F(ManagerStartTest, UnknownInCarDisplayRefusesNothing) {
+    device.inCarDisplay->setActive(true);
+    device.failNext("InCarDisplay.isActive", EIO);
+    accept();
+    startInApp();
+    EXPECT_TRUE(application->recording);
+}
+
+TEST_F(ManagerStartTest, SystemRecordingNeedsTheEntitlement) {
+    callFrom(10);
+    request(true, handler());
+    expectRefusal(*application, -5810, true);
+}
+
+TEST_F(ManagerStartTest, ForeignOrUnknownWindowsAreRefused) {
+    for (const std::uint32_t foreign : {8U, 9U}) {
+        answers.clear();
+        contexts = {7, foreign};
+        startInApp();
+        expectRefusal(*application, -5803, false);
+    }
+    EXPECT_FALSE(log.contains("KVRecordingManager:stopCurrentRecordingSession:"));
+}
+
+TEST_F(ManagerStartTest, NoWindowsAtAllPass) {
+    contexts = {};
+    accept();
+    startInApp();
+    EXPECT_TRUE(application->recording);
+}
+
+TEST_F(ManagerStartTest, RepeatedStartOfTheSystemRecordingEndsTheFirstBeforeTheSecond) {
+    system->recording = true;
+    system->systemRecording = true;
+    startSystem();
+    EXPECT_EQ(system->start, nullptr);
+    system->recording = true;  // as if the caller had got it going again meanwhile
+    manager->setMicrophoneRecording(true);
+    system->completeFinish(std::nullopt, std::nullopt);
+    EXPECT_THAT(answers, ElementsAre(Answer{0, true, false}));
+    EXPECT_EQ(system->client->messages().front(), kUpdate);
+    EXPECT_EQ(system->start, nullptr) << "nothing is changed";
+}
+
+TEST_F(ManagerStartTest, FreeSpaceMustBeAboveTheBound) {
+    device.setFreeSpace(100000000);
+    startInApp();
+    expectRefusal(*application, -5805, true);
+    EXPECT_TRUE(log.contains("insufficient disk space for recording, calling handler with error"));
+    device.setFreeSpace(100000001);
+    accept();
+    startInApp();
+    EXPECT_TRUE(application->recording);
+}
+
+TEST_F(ManagerStartTest, ApplicationInTheBackgroundIsRefused) {
+    device.applications->change({kApplicationStateForegroundObscured, 10, true, "com.example.app"});
+    startInApp();
+    expectRefusal(*application, -5803, false);
+    EXPECT_TRUE(log.contains("app is not in the foreground, calling handler with error"));
+}
+
+TEST_F(ManagerStartTest, CallerWithoutASessionIsRefused) {
+    addApplication(12, "com.example.other", {{"com.quillon.private.kelvo-kit", true}});
+    callFrom(12);
+    request(true, handler());
+    EXPECT_THAT(answers, ElementsAre(Answer{-5803, false, false}));
+}
+
+TEST_F(ManagerStartTest, LockedDeviceRefusesWhoeverWantsAnAnswer) {
+    manager->setDeviceLocked(true);
+    startSystem();
+    expectRefusal(*system, -5809, true);
+    EXPECT_TRUE(log.contains("failed to start system recording because device was in locked state"));
+    startSystem(nullptr);
+    EXPECT_TRUE(system->recording);
+}
+
+TEST_F(ManagerStartTest, LockedDeviceDoesNotConcernApplications) {
+    manager->setDeviceLocked(true);
+    accept();
+    startInApp();
+    EXPECT_TRUE(application->recording);
+}
+
+TEST_F(ManagerStartTest, DecliningUserRefuses) {
+    device.answerAlert(SystemAlertResponse::defaultButton);
+    startInApp();
+    expectRefusal(*application, -5801, false);
+    EXPECT_TRUE(log.contains("user declined"));
+    EXPECT_FALSE(log.contains("starting..."));
+    EXPECT_TRUE(manager->isMicrophoneRecording()) << "what was asked for stays";
+}
+
+TEST_F(ManagerStartTest, MicrophoneThatTheUserRefusesIsNotRecorded) {
+    device.answerAlert(SystemAlertResponse::otherButton);
+    startInApp();
+    EXPECT_FALSE(application->microphone);
+    application->completeStart();
+    EXPECT_THAT(answers, ElementsAre(Answer{0, false, false}));
+}
+
+TEST_F(ManagerStartTest, PresentPreferenceSuppressesTheAlertOnInternalBuildsOnly) {
+    device.preferences->set("KVSuppressAlert", false);
+    device.answerAlert(SystemAlertResponse::defaultButton);
+    startInApp();
+    EXPECT_EQ(device.alerts->shownAlerts().size(), 1U) << "not an internal build";
+    device.device->setInternalBuild(true);
+    startInApp();
+    EXPECT_EQ(device.alerts->shownAlerts().size(), 1U);
+    EXPECT_TRUE(application->recording && application->microphone);
+    EXPECT_TRUE(log.contains("KVRecordingManager: suppressAlert=1"));
+}
+
+TEST_F(ManagerStartTest, InternalBuildWithoutThePreferenceAsks) {
+    device.device->setInternalBuild(true);
+    accept();
+    startInApp();
+    EXPECT_EQ(device.alerts->shownAlerts().size(), 1U);
+    EXPECT_TRUE(log.contains("KVRecordingManager: suppressAlert=0"));
+}
+
+TEST_F(ManagerStartTest, SplitScreenRefusesAfterTheUserWasAsked) {
+    device.setLayout({0, 1});
+    accept();
+    startInApp();
+    expectRefusal(*application, -5807, false);
+    EXPECT_EQ(device.alerts->shownAlerts().size(), 1U);
+    EXPECT_TRUE(log.contains("attempted to start recording in split mode, bailing out"));
+    startSystem();
+    EXPECT_TRUE(system->recording) << "the whole screen may be split";
+    EXPECT_EQ(manager->levelOneElementCount(), 2);
+}
+
+TEST_F(ManagerStartTest, LayoutIsWatchedFromTheFirstStartOnce) {
+    accept();
+    startInApp();
+    EXPECT_EQ(device.displayLayout->observerCount(), 1U);
+    application->recording = false;
+    startInApp();
+    EXPECT_EQ(device.displayLayout->monitorCount(), 1);
+}
+
+TEST_F(ManagerStartTest, BroadcastWithoutASetUpIsRefusedWithoutAText) {
+    broadcast = true;
+    accept();
+    startInApp();
+    expectRefusal(*application, -5808, true);
+    EXPECT_EQ(lastError, KVError(std::string(KVRecordingErrorDomain), -5808));
+    EXPECT_TRUE(log.contains("attempted to start broadcast without a session, bailing out"));
+}
+
+TEST_F(ManagerStartTest, BroadcastIsEnabledWithWhatTheSetUpFound) {
+    broadcast = true;
+    const auto configuration = std::make_shared<KVBroadcastConfiguration>();
+    endpoint = std::make_shared<SimulatedEndpoint>(std::weak_ptr<SimulatedListener>());
+    application->extension = Dictionary{
+        {"KVBroadcastInfoExtensionKey", "extension"},
+        {"KVBroadcastInfoExtensionProcessModeKey", 1},
+        {"KVBroadcastInfoExtensionUserInfoKey", Dictionary{{"k", 1}}},
+        {"KVBroadcastInfoExtensionConfigurationKey", std::shared_ptr<ObjectHandle>(configuration)}};
+    accept();
+    startInApp();
+    EXPECT_TRUE(application->recording && application->broadcasting);
+    EXPECT_EQ(application->broadcastConfiguration, configuration);
+    EXPECT_EQ(application->enabledExtension, Value("extension"));
+    EXPECT_EQ(application->broadcastProcessMode, BroadcastProcessMode::sampleBuffers);
+    EXPECT_EQ(application->broadcastUserInfo, (Dictionary{{"k", 1}}));
+    EXPECT_EQ(application->listenerEndpoint, endpoint);
+    EXPECT_TRUE(log.contains("broadcast requested"));
+    EXPECT_TRUE(log.contains("found broadcast info, enabling for session"));
+}
+
+TEST_F(ManagerStartTest, BroadcastThatCannotBeEnabledRefusesWhoeverWantsAnAnswer) {
+    broadcast = true;
+    application->extension = Dictionary();
+    application->broadcastError = KVError("domain", 5);
+    accept();
+    startInApp();
+    expectRefusal(*application, 5, true);
+    request(false, nullptr);
+    EXPECT_TRUE(application->recording);
+}
+
+TEST_F(ManagerStartTest, OtherRecordingsAreInterrupted) {
+    const auto other = session("com.example.other");
+    device.alerts->answer(SystemAlertResponse::alternateButton);
+    application->onRequest = [&](const std::string& name) {
+        if (name == "setBroadcasting") other->recording = true;
+    };
+    startInApp();
+    EXPECT_THAT(other->requests, ElementsAre("finishSession"));
+    application->onRequest = nullptr;
+}
+
+TEST_F(ManagerStartTest, CurrentRecordingIsStoppedFirst) {
+    const auto other = recordingSession("com.example.other");
+    accept();
+    startInApp();
+    EXPECT_THAT(other->requests, ElementsAre("finishAndCleanupSessionFiles"));
+    EXPECT_TRUE(application->recording);
+}
+
+struct SoundCase {
+    const char* name;
+    std::optional<bool> shutterClick;
+    bool screenReader;
+    bool isHeard;
+};
+
+class ManagerSoundTest : public ManagerStartTest, public testing::WithParamInterface<SoundCase> {};
+
+TEST_P(ManagerSoundTest, SystemRecordingIsHeardWhereItMustBe) {
+    device.device->setRegionalBehaviorShutterClick(GetParam().shutterClick);
+    device.accessibility->setScreenReaderRunning(GetParam().screenReader);
+    startSystem();
+    system->completeStart();
+    EXPECT_EQ(device.sounds->played().size(), GetParam().isHeard ? 1U : 0U);
+    manager->prepareForStoppingSession(system);
+    if (GetParam().isHeard) EXPECT_THAT(device.sounds->played(), ElementsAre(1117U, 1118U));
+    system->recording = false;
+    callFrom(10);
+    accept();
+    startInApp();
+    application->completeStart();
+    EXPECT_EQ(device.sounds->played().size(), GetParam().isHeard ? 2U : 0U) << "applications make none";
+}
+
+INSTANTIATE_TEST_SUITE_P(Reasons, ManagerSoundTest,
+                         testing::Values(SoundCase{"Nothing", std::nullopt, false, false},
+                                         SoundCase{"RegionSaysNo", false, false, false},
+                                         SoundCase{"RegionSaysYes", true, false, true},
+                                         SoundCase{"ScreenReader", std::nullopt, true, true}),
+                         [](const auto& test) { return test.param.name; });
+
+}  // namespace
+}  // namespace kelvo
