@@ -1,13 +1,11 @@
 #pragma once
 
 #include "platform/Accessibility.h"
-#include "platform/AnalyticsSink.h"
 #include "platform/ApplicationState.h"
 #include "platform/BulletinService.h"
 #include "platform/CallObserver.h"
 #include "platform/DisplayLayout.h"
 #include "platform/InCarDisplay.h"
-#include "platform/PhotoLibrary.h"
 #include "platform/RestrictionsProfile.h"
 #include "platform/SystemAlert.h"
 #include "platform/SystemSounds.h"
@@ -18,12 +16,6 @@
 /// Services that this Linux device does not have (yet): each answers as a device would on which the thing in
 /// question never happens. All are thread-safe, having no state.
 namespace kelvo {
-
-/// A device whose usage nobody gathers.
-class UngatheredAnalytics : public AnalyticsSink {
-  public:
-    OptionalError send(const AnalyticsMessage&) override { return std::nullopt; }
-};
 
 /// A device that nobody calls.
 class SilentCallObserver : public CallObserver {
@@ -80,16 +72,6 @@ class ShelllessAlerts : public SystemAlertService {
     Result<std::shared_ptr<SystemAlert>> createAlert(const SystemAlertContent&) override {
         return KVError::posix(ENOSYS, "no system shell shows alerts");
     }
-};
-
-/// A device without a photo library.
-class MissingPhotoLibrary : public PhotoLibrary {
-  public:
-    Result<PhotoAsset> createVideoAsset(const URL&) override {
-        return KVError::posix(ENOSYS, "no photo library");
-    }
-    std::optional<PhotoAsset> assetWithLocalIdentifier(std::string_view) override { return std::nullopt; }
-    OptionalError deleteAsset(const PhotoAsset&) override { return KVError::posix(ENOENT, "no such asset"); }
 };
 
 /// A device that makes no sound of its own.
