@@ -33,23 +33,9 @@ class CaptureManager {
     /// Ends everything and forgets the outputs.
     virtual void stopAllCapture() = 0;
 
-    /// Where the recording's timeline stands, after a pause moved it.
+    /// Where the recording's timeline begins, or where it goes on after a pause. Application audio reaches
+    /// its output from then on; `stopAllCapture` takes it back.
     virtual void setCaptureStartTime(const MediaTime& time) = 0;
-};
-
-/// The capture manager of a device without sound: there is no microphone, and applications are tapped without
-/// ever yielding a sample.
-class SoundlessCaptureManager : public CaptureManager {
-  public:
-    bool hasAudioCaptureDevice() override { return false; }
-    void startMicrophoneCaptureWithOutput(SampleHandler, DidStartHandler) override {}
-    void startAppAudioCaptureForProcessID(std::int32_t, SampleHandler, DidStartHandler didStart) override {
-        if (didStart) didStart();  // the recording goes on without sound
-    }
-    void stopAppAudioCapture() override {}
-    void resumeAppAudioCaptureForProcessID(std::int32_t, SampleHandler) override {}
-    void stopAllCapture() override {}
-    void setCaptureStartTime(const MediaTime&) override {}
 };
 
 }  // namespace kelvo

@@ -20,6 +20,7 @@ constexpr AudioFormatRecord kAudioBasicDescription{
 }  // namespace
 
 std::shared_ptr<KVCaptureManager> KVCaptureManager::sharedManager(const Platform& platform) {
+    audioDispatchQueue();  // first, so that it outlives the manager, which may still be called by a tap
     static Guarded<std::shared_ptr<KVCaptureManager>> manager;
     return manager.with([&](auto& shared) {
         if (!shared) shared = create(platform);

@@ -1,6 +1,7 @@
 #include "platform/ConnectionBase.h"
 
 #include "base/KVLog.h"
+#include "platform/IPCBounds.h"
 
 #include <cerrno>
 #include <utility>
@@ -17,6 +18,26 @@ class Serving {
     ~Serving() { connectionServed.reset(); }
     Serving(const Serving&) = delete;
     Serving& operator=(const Serving&) = delete;
+};
+
+/// Counts a reply as owed for as long as somebody may still send it.
+class OwedReply {
+  public:
+    explicit OwedReply(std::shared_ptr<std::atomic<std::size_t>> owed) : owed_(std::move(owed)) { ++*owed_; }
+    ~OwedReply() { settle(); }
+    OwedReply(const OwedReply&) = delete;
+    OwedReply& operator=(const OwedReply&) = delete;
+
+    /// True the first time.
+    bool settle() {
+        if (isSettled_.exchange(true)) return false;
+        --*owed_;
+        return true;
+    }
+
+  private:
+    const std::shared_ptr<std::atomic<std::size_t>> owed_;
+    std::atomic<bool> isSettled_{false};
 };
 
 KVError connectionOver() {
@@ -94,13 +115,27 @@ void ConnectionBase::enqueue(Task task) {
     });
 }
 
-void ConnectionBase::received(std::size_t method, Array arguments, IPCReply reply) {
-    ++waitingMessages_;
-    enqueue([self = shared_from_this(), method, arguments = std::move(arguments), reply = std::move(reply)] {
-        self->serve(method, arguments, reply);
-        --self->waitingMessages_;
+void ConnectionBase::received(std::size_t method, Array arguments, IPCReply reply, WaitingCost cost) {
+    if (reply && *owedReplies_ >= ipc_bounds::kMostOwedReplies)
+        return cutOff("more requests than may be outstanding");
+    waitingMessages_ += cost.messages;
+    waitingBytes_ += cost.bytes;
+    waitingDescriptors_ += cost.descriptors;
+    enqueue([self = shared_from_this(), method, arguments = std::move(arguments),
+             reply = owed(std::move(reply)), cost]() mutable {
+        self->serve(method, std::exchange(arguments, {}), std::exchange(reply, nullptr));
+        self->waitingMessages_ -= cost.messages;
+        self->waitingBytes_ -= cost.bytes;
+        self->waitingDescriptors_ -= cost.descriptors;
         self->didServe();
     });
+}
+
+IPCReply ConnectionBase::owed(IPCReply reply) const {
+    if (!reply) return nullptr;
+    return [reply = std::move(reply), owed = std::make_shared<OwedReply>(owedReplies_)](Array values) {
+        if (owed->settle()) reply(std::move(values));
+    };
 }
 
 /// What a lost peer sent before it went still counts; after an invalidation nothing is served.

@@ -33,8 +33,13 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     static IPCConnectionRef current();
 
     bool isOver() const { return state_ != State::open; }
-    /// Messages that arrived and are not served yet.
-    std::size_t waitingMessages() const { return waitingMessages_; }
+    /// What messages cost that arrived and are not served yet.
+    struct WaitingCost {
+        std::size_t messages = 0;
+        std::size_t bytes = 0;
+        std::size_t descriptors = 0;
+    };
+    WaitingCost waitingCost() const { return {waitingMessages_, waitingBytes_, waitingDescriptors_}; }
 
     /// Ends the connection because of what the peer did, and logs why in one line.
     void cutOff(const std::string& reason);
@@ -45,8 +50,10 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
 
     explicit ConnectionBase(const char* queueLabel) : queue_(queueLabel) {}
 
-    /// From the transport: a message of the exported interface arrived. `reply` as `IPCExportedObject` says.
-    void received(std::size_t method, Array arguments, IPCReply reply);
+    /// From the transport: a message of the exported interface arrived. `reply` as `IPCExportedObject` says,
+    /// but that it may be called more than once and after the end: that is seen to here. A peer that waits
+    /// for too many replies is cut off instead.
+    void received(std::size_t method, Array arguments, IPCReply reply, WaitingCost cost = {1, 0, 0});
     /// The reply arrived to what was sent with this identifier; an unknown one is ignored.
     void receivedReply(ReplyIdentifier identifier, Array values);
     /// The peer could not serve it.
@@ -63,7 +70,7 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
                                    ReplyIdentifier identifier) = 0;
     /// Starts receiving; called once.
     virtual void didResume() {}
-    /// A message was served: `waitingMessages` fell.
+    /// A message was served: `waitingCost` fell.
     virtual void didServe() {}
     /// The connection has ended: release what it holds of the system. Called once, on any thread.
     virtual void close() = 0;
@@ -95,6 +102,7 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
               const std::function<void(const KVError&)>& errorHandler);
     OptionalError trySend(std::size_t method, const Array& arguments, AwaitedReply awaited);
     AwaitedReply takeAwaited(ReplyIdentifier identifier);
+    IPCReply owed(IPCReply reply) const;
     void serve(std::size_t method, const Array& arguments, const IPCReply& reply);
     void openGate();
     void runHandlers(State state);
@@ -102,6 +110,10 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     SerialQueue queue_;
     std::atomic<State> state_{State::open};
     std::atomic<std::size_t> waitingMessages_{0};
+    std::atomic<std::size_t> waitingBytes_{0};
+    std::atomic<std::size_t> waitingDescriptors_{0};
+    const std::shared_ptr<std::atomic<std::size_t>> owedReplies_ =
+        std::make_shared<std::atomic<std::size_t>>(0);
     std::atomic<ReplyIdentifier> lastIdentifier_{0};
     Guarded<Exported> exported_;
     Guarded<std::shared_ptr<const IPCInterface>> remoteInterface_;

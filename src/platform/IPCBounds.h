@@ -13,8 +13,10 @@ inline constexpr std::size_t kLargestMessage = std::size_t{1} << 20;
 inline constexpr std::size_t kLargestHeader = std::size_t{4} << 10;
 /// Structures, arrays and variants inside one another.
 inline constexpr int kDeepestNesting = 16;
-/// Elements of one array, other than bytes; entries of one dictionary.
+/// Elements of one array, other than bytes.
 inline constexpr std::size_t kMostElements = 4096;
+/// Entries of one dictionary. Look-ups walk them; so many bound what a hostile one costs.
+inline constexpr std::size_t kMostEntries = 512;
 /// Values in one message altogether: what they cost in memory is a multiple of their bytes.
 inline constexpr std::size_t kMostValues = 16384;
 /// Bytes of one string.
@@ -22,9 +24,11 @@ inline constexpr std::size_t kLongestString = std::size_t{256} << 10;
 /// Descriptors in one message.
 inline constexpr std::size_t kMostDescriptors = 4;
 
-/// Messages of one connection that wait for their turn. The socket is not read beyond it, so a sender that is
-/// too fast is slowed down, not cut off.
+/// Messages of one connection that wait for their turn, their bytes and their descriptors. The socket is not
+/// read beyond them, so a sender that is too fast is slowed down, not cut off.
 inline constexpr std::size_t kMostWaitingMessages = 32;
+inline constexpr std::size_t kMostWaitingBytes = std::size_t{1} << 20;
+inline constexpr std::size_t kMostWaitingDescriptors = 8;
 /// Requests of one connection whose replies are owed.
 inline constexpr std::size_t kMostOwedReplies = 256;
 /// Bytes that wait for one peer to read them. Two seconds of captured sound fit many times.

@@ -30,6 +30,7 @@ void KVRecordingSession::resetForStart() {
     bundleIDOfFirstForegroundApp_.set(std::nullopt);
     captureStartTime_.set(std::nullopt);
     paused_ = false;
+    timeline_.with([](Timeline& timeline) { timeline.hasBegun = false; });
     shouldStopLock_.lock();
     shouldStop_ = false;
     shouldStopLock_.unlock();

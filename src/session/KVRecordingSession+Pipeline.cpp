@@ -3,6 +3,8 @@
 #include "session/KVRecordingSession.h"
 #include "session/SampleRebase.h"
 
+#include <utility>
+
 namespace kelvo {
 
 void KVRecordingSession::screenCaptureControllerDidReceiveSampleBuffer(ScreenCaptureSource&,
@@ -11,16 +13,23 @@ void KVRecordingSession::screenCaptureControllerDidReceiveSampleBuffer(ScreenCap
     if (!sample) return;
     const VideoSurface& surface = *sample->surface();
     KVLog("Screen sampled at w:%zu h:%zu", std::size_t{surface.width()}, std::size_t{surface.height()});
-    timeline_.with([&](Timeline& timeline) {
-        if (timeline.firstSampleTimestamp.isZero())
-            timeline.firstSampleTimestamp = sample->presentationTime();
-    });
+    beginTimeline(sample->presentationTime());
     updateDuartionWithSample(*sample);
     if (broadcastExtension()) {
         _processSampleBufferForStreaming(sample, flags);
     } else {
         _processSampleBuffer(sample, flags);
     }
+}
+
+/// The first frame of the session fixes the beginning for good; the first one of each recording lets
+/// application audio in.
+void KVRecordingSession::beginTimeline(const MediaTime& presentationTime) {
+    const bool isFirst = timeline_.with([&](Timeline& timeline) {
+        if (timeline.firstSampleTimestamp.isZero()) timeline.firstSampleTimestamp = presentationTime;
+        return !std::exchange(timeline.hasBegun, true);
+    });
+    if (isFirst) services_.captureManager->setCaptureStartTime(presentationTime);
 }
 
 void KVRecordingSession::_processSampleBufferForStreaming(const SampleBufferRef& sample,

@@ -1,6 +1,7 @@
 #include "session/KVRecordingSession.h"
 
 #include "base/KVLog.h"
+#include "media/KVCaptureManager.h"
 #include "media/KVMovieWriter.h"
 
 #include <utility>
@@ -82,7 +83,7 @@ SessionFactory recordingSessionFactory(const Platform& platform) {
         std::make_shared<KVTemporaryFileStore>(platform.fileSystem, platform.textFolding, platform.clock);
     services.localization = std::make_shared<KVLocalization>(platform.bundles, platform.languages);
     services.errors = std::make_shared<KVUserErrors>(services.localization);
-    services.captureManager = std::make_shared<SoundlessCaptureManager>();
+    services.captureManager = KVCaptureManager::sharedManager(platform);
     const KVMovieWriter::Services writing{platform.media, services.store, platform.preferences,
                                           platform.device};
     services.createMovieWriter = [writing](const Size& windowSize, const std::string& outputPath) {

@@ -215,6 +215,7 @@ class KVRecordingSession : public RecordingSession,
         MediaTime lastSampleTimestamp = MediaTime::invalid();
         MediaTime sampleTimeOffset = MediaTime::zero();
         bool sessionWasResumed = false;
+        bool hasBegun = false;  ///< a frame has come since the start
     };
 
     /// Tells one run of capturing from the next: whoever starts it late sees that it was stopped meanwhile.
@@ -243,6 +244,7 @@ class KVRecordingSession : public RecordingSession,
     // Pipeline.
     void _processSampleBufferForStreaming(const SampleBufferRef& sample, const ScreenTransform& flags);
     void _processSampleBuffer(const SampleBufferRef& sample, const ScreenTransform& flags);
+    void beginTimeline(const MediaTime& presentationTime);
     void moveTimeline(const MediaTime& presentationTime);
     void _updateSampleBufferWithOffset(const SampleBufferRef& sample, const SampleHandler& handler);
     void routeVideo(const SampleBufferRef& sample, const ScreenTransform& flags);

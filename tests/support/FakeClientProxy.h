@@ -29,48 +29,48 @@ class FakeClientProxy : public KVClientProxyBase {
 
     void updateScreenRecordingState() override { note("updateScreenRecordingState"); }
     void updateBroadcastServiceInfo(const Dictionary& serviceInfo) override {
-        note("updateBroadcastServiceInfo");
         serviceInfos.with([&](auto& all) { all.push_back(serviceInfo); });
+        note("updateBroadcastServiceInfo");
     }
     void updateBroadcastURL(const URL& broadcastURL) override {
-        note("updateBroadcastURL");
         broadcastURLs.with([&](auto& all) { all.push_back(broadcastURL); });
+        note("updateBroadcastURL");
     }
     void recordingDidStopWithError(const OptionalError& error, const std::optional<URL>& movieURL) override {
-        note("recordingDidStopWithError");
         stops.with([&](auto& all) { all.push_back({error, movieURL}); });
+        note("recordingDidStopWithError");
     }
     void recordingLockInterrupted(const KVError& error) override {
-        note("recordingLockInterrupted");
         lockInterruptions.with([&](auto& all) { all.push_back(error); });
+        note("recordingLockInterrupted");
     }
     void recordingShouldResume() override { note("recordingShouldResume"); }
     void recordingDidPause() override { note("recordingDidPause"); }
     void recordingTimerDidUpdate(const std::string& timerText) override {
-        note("recordingTimerDidUpdate");
         timerTexts.with([&](auto& all) { all.push_back(timerText); });
+        note("recordingTimerDidUpdate");
     }
     void captureHandlerWithSample(const std::shared_ptr<KVIOSurfaceObject>& surface,
                                   const RecordBytes<TimingRecord>& timingData) override {
-        note("captureHandlerWithSample");
         videoSamples.with([&](auto& all) { all.push_back({surface, timingData}); });
+        note("captureHandlerWithSample");
     }
     void captureHandlerWithAudioSample(std::span<const std::byte> audioData,
                                        const RecordBytes<AudioFormatRecord>& absdData, std::int64_t itemCount,
                                        SampleBuffer::Type bufferType,
                                        const RecordBytes<TimingRecord>& timingData) override {
-        note("captureHandlerWithAudioSample");
         audioSamples.with([&](auto& all) {
             all.push_back(
                 {Bytes(audioData.begin(), audioData.end()), absdData, itemCount, bufferType, timingData});
         });
+        note("captureHandlerWithAudioSample");
     }
     void resetConnectionWithProcessIdentifier(std::int32_t processIdentifier) override {
-        note("resetConnectionWithProcessIdentifier");
         resetProcesses.with([&](auto& all) { all.push_back(processIdentifier); });
+        note("resetConnectionWithProcessIdentifier");
     }
 
-    /// The names of the messages so far, in order.
+    /// The names of the messages so far, in order; what a message brought is kept before it is named.
     std::vector<std::string> messages() const { return messages_.copy(); }
 
     Guarded<std::vector<Dictionary>> serviceInfos;

@@ -49,12 +49,10 @@ class FakeDaemon : public KVConnectionManagerDelegate {
         if (handler) handler({{{"displayName", "One"}}, {{"displayName", "Two"}}}, std::nullopt);
     }
     void stopRecordingWithHandler(MovieHandler handler) override {
+        if (keepsStopHandler)
+            keptStopHandler.set(std::exchange(handler, nullptr));  // before a waiting test is woken
         note("stopRecordingWithHandler");
-        if (keepsStopHandler) {
-            keptStopHandler.set(std::move(handler));
-        } else if (handler) {
-            handler(URL("file:///movie.mp4"), std::nullopt);
-        }
+        if (handler) handler(URL("file:///movie.mp4"), std::nullopt);
     }
     void stopRecordingWithStartClipDuration(double startClipDuration, double endClipDuration,
                                             MovieHandler handler) override {

@@ -112,8 +112,9 @@ class SocketTransportTest : public testing::Test {
         explicit Gate(std::shared_ptr<KVConnectionManager> manager) : manager_(std::move(manager)) {}
         bool listenerShouldAcceptNewConnection(IPCListener& listener,
                                                const IPCConnectionRef& connection) override {
-            accepted.with([&](auto& all) { all.push_back(connection); });
-            return manager_->listenerShouldAcceptNewConnection(listener, connection);
+            const bool isKept = manager_->listenerShouldAcceptNewConnection(listener, connection);
+            accepted.with([&](auto& all) { all.push_back(connection); });  // now that it is set up
+            return isKept;
         }
         Guarded<std::vector<IPCConnectionRef>> accepted;
 

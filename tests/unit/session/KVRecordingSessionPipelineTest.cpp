@@ -16,6 +16,7 @@ class Pipeline : public SessionFixture {
         // The frame that the simulated screen delivers by itself is not wanted here.
         if (writer) writer->video.clear();
         if (writer) writer->transforms.clear();
+        captureManager->startTimes.clear();
         client->frames.clear();
         delegate->durations.clear();
     }
@@ -164,10 +165,36 @@ TEST_F(Pipeline, RebasedFrameSharesItsPictureAndMovesTheCapturesTime) {
     EXPECT_EQ(sample->presentationTime(), at(5000)) << "the original is untouched";
 }
 
-TEST_F(Pipeline, NoTimeIsToldWhileNothingIsCutOut) {
+TEST_F(Pipeline, FirstFrameLetsApplicationAudioInOnce) {
+    session->setRecording(true);
+    frame(1000);
+    frame(2000);
+    EXPECT_EQ(captureManager->startTimes, std::vector{at(1000)});
+}
+
+TEST_F(Pipeline, FirstFrameOfTheNextRecordingLetsApplicationAudioInAgain) {
+    start();
+    finish();
+    captureManager->startTimes.clear();
+    session->setRecording(true);
+    session->startSessionWithHandler(nullptr);
+    frame(9 * kSecond);
+    frame(10 * kSecond);
+    EXPECT_EQ(captureManager->startTimes, std::vector{at(9 * kSecond)});
+}
+
+TEST_F(Pipeline, EveryPauseEndsInATimeForApplicationAudio) {
     begin();
     frame(1000);
-    EXPECT_TRUE(captureManager->startTimes.empty());
+    pauseAndResume();
+    frame(5000);
+    EXPECT_EQ(captureManager->calls.back(), "stop all") << "which forgets the time from before the pause";
+    EXPECT_EQ(captureManager->startTimes, std::vector{at(1000)});
+    frame(6000);
+    captureManager->startTimes.clear();
+    pauseAndResume();
+    frame(9000);
+    EXPECT_EQ(captureManager->startTimes, std::vector{at(2000)});
 }
 
 /// A session whose samples cannot be copied.

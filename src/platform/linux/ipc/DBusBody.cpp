@@ -358,7 +358,7 @@ class BodyReader {
         if (element != "{sv}") return fail("dictionary of other types");
         Dictionary dictionary;
         while (!failure_ && place_ < end) {
-            if (dictionary.size() == kMostEntries) return fail("dictionary beyond its bound");
+            if (dictionary.size() == ipc_bounds::kMostEntries) return fail("dictionary beyond its bound");
             align(8);
             const Value key = read("s", depth + 1);
             Value value = read("v", depth + 1);
@@ -416,9 +416,6 @@ class BodyReader {
         place_ = bytes_.size();
         return {};
     }
-
-    /// Look-ups walk a dictionary's entries; so many bound what a hostile one costs.
-    static constexpr std::size_t kMostEntries = 512;
 
     Message& message_;
     std::span<const std::byte> bytes_;

@@ -40,26 +40,6 @@ dbus::Message replyMessage(dbus::MessageType type, std::uint32_t serial) {
     return reply;
 }
 
-/// Counts a reply as owed for as long as somebody may still send it.
-class OwedReply {
-  public:
-    explicit OwedReply(std::shared_ptr<std::atomic<std::size_t>> owed) : owed_(std::move(owed)) { ++*owed_; }
-    ~OwedReply() { settle(); }
-    OwedReply(const OwedReply&) = delete;
-    OwedReply& operator=(const OwedReply&) = delete;
-
-    /// True the first time.
-    bool settle() {
-        if (isSettled_.exchange(true)) return false;
-        --*owed_;
-        return true;
-    }
-
-  private:
-    const std::shared_ptr<std::atomic<std::size_t>> owed_;
-    std::atomic<bool> isSettled_{false};
-};
-
 }  // namespace
 
 void SocketConnection::handle(dbus::Message message) {
@@ -91,22 +71,18 @@ void SocketConnection::handleExportedCall(dbus::Message message, std::size_t met
     auto arguments = dbus::readBody(message, allowsObjects(description.arguments));
     if (!arguments) return cutOff(description.name + ": " + arguments.error().localizedDescription());
     IPCReply reply;
-    if (message.wantsReply() && !description.isOneWay()) {
-        if (*owedReplies_ >= ipc_bounds::kMostOwedReplies)
-            return cutOff("more requests than may be outstanding");
-        reply = replyTo(message.serial, description);
-    }
-    received(method, std::move(*arguments), std::move(reply));
+    if (message.wantsReply() && !description.isOneWay()) reply = replyTo(message.serial, description);
+    received(method, std::move(*arguments), std::move(reply),
+             {1, message.body.size(), message.descriptors.size()});
     // A one-way request has nothing to say, but a caller that waits for its end is let go.
     if (message.wantsReply() && description.isOneWay()) answer(message, "", {});
 }
 
 IPCReply SocketConnection::replyTo(std::uint32_t serial, const IPCMethod& method) {
     return [weakSelf = std::weak_ptr(std::static_pointer_cast<SocketConnection>(shared_from_this())), serial,
-            name = method.name, signature = signatureOf(*method.reply),
-            owed = std::make_shared<OwedReply>(owedReplies_)](const Array& values) {
+            name = method.name, signature = signatureOf(*method.reply)](const Array& values) {
         const auto self = weakSelf.lock();
-        if (!owed->settle() || !self || self->isOver()) return;
+        if (!self || self->isOver()) return;
         dbus::Message reply = replyMessage(dbus::MessageType::reply, serial);
         reply.member = name;
         reply.signature = signature;

@@ -40,9 +40,12 @@ SocketConnection::~SocketConnection() {
 void SocketConnection::didResume() {
     const Socket held = socket();
     if (!held || token_ != 0) return;
-    token_ = loop_->add(held->get(), std::static_pointer_cast<SocketConnection>(shared_from_this()));
+    const auto token =
+        loop_->add(held->get(), std::static_pointer_cast<SocketConnection>(shared_from_this()));
+    token_ = token;
+    // It may have ended while it was being added, before there was a token to remove.
+    if (!socket()) return loop_->remove(held->get(), token);
     arm();
-    if (isOver()) close();  // it ended while it was being added
 }
 
 void SocketConnection::close() {
@@ -60,34 +63,39 @@ void SocketConnection::close() {
 }
 
 bool SocketConnection::isPaused() const {
-    return waitingMessages() >= kMostWaitingMessages;
+    const WaitingCost waiting = waitingCost();
+    return waiting.messages >= kMostWaitingMessages || waiting.bytes >= kMostWaitingBytes ||
+           waiting.descriptors >= kMostWaitingDescriptors;
 }
 
 /// Asks for what this connection can use now: input unless too much waits, output while something is unsent.
+/// Output is nearly always possible, so it also stands for "at once": for the first look, which begins the
+/// deadline of a peer that says nothing, and for what was received but held up.
 void SocketConnection::arm() {
     const Socket held = socket();
     if (!held || token_ == 0) return;
     // Under the lock, so that the latest look at the queue is also the latest to be armed.
     const std::lock_guard lock(outMutex_);
     std::uint32_t events = isPaused() ? 0U : EPOLLIN;
-    if (maySend() && !out_.queue.empty()) events |= EPOLLOUT;
+    const bool isDueNow = !wasLookedAt_ || (isHeldUp_ && !isPaused());
+    if (isDueNow || (maySend() && !out_.queue.empty())) events |= EPOLLOUT;
     if (events != 0) loop_->arm(held->get(), token_, events);
 }
 
 void SocketConnection::didServe() {
-    if (waitingMessages() != kMostWaitingMessages / 2) return;
-    const Socket held = socket();
-    // Output is nearly always possible: so the loop looks at once at what was received but not handled.
-    if (held && token_ != 0) loop_->arm(held->get(), token_, EPOLLIN | EPOLLOUT);
+    if (isHeldUp_ && !isPaused()) arm();
 }
 
 void SocketConnection::ready(std::uint32_t) {
     const Socket held = socket();
     if (!held) return;
+    wasLookedAt_ = true;
     if (flush(held->get()) == Flushed::lost) return end(State::lost);
+    isHeldUp_ = false;
     handleReceived();
     if (!isPaused() && !isOver()) receive(held->get());
     if (isOver()) return;
+    if (isPaused()) isHeldUp_ = true;  // before it is armed: whoever serves the last message looks at it
     const bool isUnfinished = !isAuthenticated_ || (!incoming_.empty() && !isPaused());
     if (!isUnfinished) {
         deadline_.reset();
@@ -105,8 +113,10 @@ std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
     return std::nullopt;
 }
 
+/// Ends after some rounds, so that a peer that never stops sending does not keep the loop for itself.
 void SocketConnection::receive(int socket) {
-    while (!isPaused() && !isOver() && receiveSome(socket))
+    constexpr int kMostRounds = 16;
+    for (int round = 0; round < kMostRounds && !isPaused() && !isOver() && receiveSome(socket); ++round)
         handleReceived();
 }
 
@@ -139,8 +149,10 @@ bool SocketConnection::receiveSome(int socket) {
 
 void SocketConnection::handleReceived() {
     if (isOver() || !authenticate()) return;
-    while (!isPaused() && !isOver() && handleNextMessage()) {
-    }
+    while (!isPaused() && !isOver() && handleNextMessage())
+        deadline_.reset();
+    if (incoming_.empty() && !receivedDescriptors_.empty() && !isOver())
+        cutOff("descriptors that belong to no message");
 }
 
 bool SocketConnection::authenticate() {
@@ -169,6 +181,7 @@ bool SocketConnection::handleNextMessage() {
     std::uint32_t descriptorCount = 0;
     auto message = dbus::parse(std::span(incoming_).first(*size), descriptorCount);
     if (!message) return cutOff(message.error().localizedDescription()), false;
+    if (descriptorCount > kMostDescriptors) return cutOff("more descriptors than allowed"), false;
     if (descriptorCount > receivedDescriptors_.size()) return cutOff("fewer descriptors than claimed"), false;
     incoming_.erase(incoming_.begin(), incoming_.begin() + static_cast<std::ptrdiff_t>(*size));
     const auto last = receivedDescriptors_.begin() + descriptorCount;

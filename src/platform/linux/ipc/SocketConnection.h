@@ -98,7 +98,8 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     std::optional<Moment> deadline_;
 
     std::atomic<bool> isAuthenticated_{false};
-    std::shared_ptr<std::atomic<std::size_t>> owedReplies_ = std::make_shared<std::atomic<std::size_t>>(0);
+    std::atomic<bool> wasLookedAt_{false};  // by the loop
+    std::atomic<bool> isHeldUp_{false};     // more was received than may wait
     std::mutex outMutex_;
     Out out_;
 };

@@ -7,11 +7,13 @@
 #include <array>
 #include <cerrno>
 #include <cstring>
+#include <fcntl.h>
 #include <filesystem>
 #include <sys/epoll.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <unistd.h>
+#include <vector>
 
 namespace kelvo {
 namespace {
@@ -64,12 +66,20 @@ UniqueFd receiveConnection(int socket, bool& isAtEnd) {
     const ssize_t count = ::recvmsg(socket, &header, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
     isAtEnd = count <= 0;
     const cmsghdr* item = isAtEnd ? nullptr : CMSG_FIRSTHDR(&header);
-    if (item == nullptr || item->cmsg_type != SCM_RIGHTS || item->cmsg_len < CMSG_LEN(sizeof(int)))
-        return UniqueFd();
-    int descriptor = -1;
-    std::memcpy(&descriptor, CMSG_DATA(item), sizeof(descriptor));
-    UniqueFd received(descriptor);
-    return isStreamSocket(descriptor) ? std::move(received) : UniqueFd();
+    if (item == nullptr || item->cmsg_level != SOL_SOCKET || item->cmsg_type != SCM_RIGHTS) return UniqueFd();
+    // Alignment leaves room for a second one, which a hostile packet fills: owned, so that it is closed.
+    std::vector<UniqueFd> received;
+    for (std::size_t place = CMSG_LEN(0); place + sizeof(int) <= item->cmsg_len; place += sizeof(int)) {
+        int descriptor = -1;
+        std::memcpy(&descriptor, reinterpret_cast<const char*>(item) + place, sizeof(descriptor));
+        received.emplace_back(descriptor);
+    }
+    const bool isConnection = received.size() == 1 && isStreamSocket(received.front().get());
+    return isConnection ? std::move(received.front()) : UniqueFd();
+}
+
+UniqueFd openNothing() {
+    return UniqueFd(::open("/dev/null", O_RDONLY | O_CLOEXEC));
 }
 
 }  // namespace
@@ -80,11 +90,21 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
     Door(std::shared_ptr<SocketLoop> loop, std::shared_ptr<BundleService> bundles, bool isNamed)
         : loop_(std::move(loop)), bundles_(std::move(bundles)), isNamed_(isNamed) {}
 
-    void setListener(SocketListener* listener) { listener_ = listener; }
-    void setSocket(UniqueFd socket) { socket_ = std::move(socket); }
-    bool hasSocket() const { return static_cast<bool>(socket_); }
+    void setListener(SocketListener* listener) {
+        const std::lock_guard lock(mutex_);
+        listener_ = listener;
+    }
+    void setSocket(UniqueFd socket) {
+        const std::lock_guard lock(mutex_);
+        socket_ = std::move(socket);
+    }
+    bool hasSocket() {
+        const std::lock_guard lock(mutex_);
+        return static_cast<bool>(socket_);
+    }
 
     void open() {
+        const std::lock_guard lock(mutex_);
         if (token_ == 0) token_ = loop_->add(socket_.get(), shared_from_this());
         loop_->arm(socket_.get(), token_, EPOLLIN);
     }
@@ -114,7 +134,16 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
     UniqueFd acceptNext(bool& isAtEnd) {
         UniqueFd next(::accept4(socket_.get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
         isAtEnd = !next;
+        if (!next && (errno == EMFILE || errno == ENFILE)) turnAwayNext();
         return next;
+    }
+
+    /// Without a descriptor left a connection stays in the socket's queue and would wake the loop for ever.
+    void turnAwayNext() {
+        spare_ = UniqueFd();
+        const UniqueFd refused(::accept4(socket_.get(), nullptr, nullptr, SOCK_CLOEXEC));
+        KVLogError("IPC: turned away a client: no descriptors left");
+        spare_ = openNothing();
     }
 
     void welcome(UniqueFd socket) {
@@ -141,8 +170,9 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
     const std::shared_ptr<Guarded<OpenConnections>> open_ = std::make_shared<Guarded<OpenConnections>>();
     std::recursive_mutex mutex_;  // a listener stays while its delegate decides, and the delegate may drop it
     SocketListener* listener_ = nullptr;
-    UniqueFd socket_;
+    UniqueFd socket_;  // set before it is opened, and kept
     SocketLoop::Token token_ = 0;
+    UniqueFd spare_ = openNothing();  // given up to accept, and end, what cannot be kept
 };
 
 SocketListener::SocketListener(std::string path, std::shared_ptr<SocketEndpoint> endpoint,

@@ -16,8 +16,8 @@ std::atomic<std::size_t> mostLiveBytes{0};
 
 }  // namespace
 
-// Counts what is allocated while it is allocated. Not inlined, or an optimising compiler sees `malloc` on one side and
-// `delete` on the other and calls them mismatched.
+// Counts what is allocated while it is allocated. Not inlined, or an optimising compiler sees `malloc` on one
+// side and `delete` on the other and calls them mismatched.
 [[gnu::noinline]] void* operator new(std::size_t size) {
     void* block = std::malloc(size);
     if (block == nullptr) std::abort();
