@@ -1,10 +1,8 @@
 #pragma once
 
 #include "platform/Accessibility.h"
-#include "platform/ApplicationState.h"
 #include "platform/BulletinService.h"
 #include "platform/CallObserver.h"
-#include "platform/DisplayLayout.h"
 #include "platform/InCarDisplay.h"
 #include "platform/RestrictionsProfile.h"
 #include "platform/SystemAlert.h"
@@ -29,21 +27,6 @@ class UnrestrictedProfile : public RestrictionsProfile {
     void addObserver(std::weak_ptr<RestrictionsObserver>) override {}
     void removeObserver(const RestrictionsObserver*) override {}
     RestrictionSetting effectiveSetting(std::string_view) override { return RestrictionSetting::unspecified; }
-};
-
-/// A display that shows one application, always.
-class UnchangingDisplayLayout : public DisplayLayoutService {
-  public:
-    std::shared_ptr<DisplayLayoutMonitor> createMonitor(int) override { return std::make_shared<Monitor>(); }
-
-  private:
-    class Monitor : public DisplayLayoutMonitor {
-      public:
-        DisplayLayout currentLayout() override { return {{DisplayLayout::Element{0}}}; }
-        void addObserver(std::weak_ptr<DisplayLayoutObserver>) override {}
-        void removeObserver(const DisplayLayoutObserver*) override {}
-        void invalidate() override {}
-    };
 };
 
 /// A bulletin service that shows nothing.
@@ -78,23 +61,6 @@ class ShelllessAlerts : public SystemAlertService {
 class SilentSystemSounds : public SystemSounds {
   public:
     void playSystemSound(std::uint32_t) override {}
-};
-
-/// A device that knows nothing of its applications but that the user sees them, always.
-class UnwatchedApplications : public ApplicationStateSource {
-  public:
-    void setUpdateHandler(UpdateHandler) override {}
-    std::optional<ApplicationInformation> informationOfProcess(std::int32_t processIdentifier) override {
-        ApplicationInformation information;
-        information.state = kApplicationStateForeground;
-        information.processIdentifier = processIdentifier;
-        return information;
-    }
-    void informationOfApplication(std::string_view, InformationHandler handler) override {
-        if (handler) handler(std::nullopt);
-    }
-    std::int32_t stateOfApplication(std::string_view) override { return kApplicationStateForeground; }
-    std::optional<std::string> frontmostApplicationBundleIdentifier() override { return std::nullopt; }
 };
 
 /// A device that reads nothing to its user.

@@ -16,6 +16,8 @@
 #include "platform/linux/system/KernelRandom.h"
 #include "platform/linux/system/SystemClock.h"
 #include "platform/linux/text/UnicodeTextFolding.h"
+#include "platform/linux/x11/X11Applications.h"
+#include "platform/linux/x11/X11DisplayLayout.h"
 #include "platform/linux/x11/X11RenderServer.h"
 #include "platform/linux/x11/X11Screen.h"
 
@@ -40,7 +42,7 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root, const std:
     platform.audio = std::make_shared<pulse::PulseAudioService>(platform.clock);
     platform.calls = std::make_shared<SilentCallObserver>();
     platform.restrictions = std::make_shared<UnrestrictedProfile>();
-    platform.displayLayout = std::make_shared<UnchangingDisplayLayout>();
+    platform.displayLayout = std::make_shared<x11::X11DisplayLayout>("");
     const auto screen = std::make_shared<x11::X11Screen>("");
     platform.screenCapture = screen;
     platform.displayMirroring = screen;
@@ -54,7 +56,7 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root, const std:
     platform.photoLibrary =
         std::make_shared<LinuxPhotoLibrary>(root, screenRecordingsFolder(*root), platform.random);
     platform.sounds = std::make_shared<SilentSystemSounds>();
-    platform.applications = std::make_shared<UnwatchedApplications>();
+    platform.applications = std::make_shared<x11::X11Applications>("", platform.bundles);
     platform.accessibility = std::make_shared<UnreadScreen>();
     platform.inCarDisplay = std::make_shared<NoInCarDisplay>();
     return platform;
