@@ -1,29 +1,14 @@
 #include "daemon/Options.h"
 #include "daemon/RunDaemon.h"
 #include "ipc/ShellAlerts.h"
-#include "platform/linux/absent/AbsentServices.h"
-#include "platform/linux/bundles/LinuxBundleService.h"
-#include "platform/linux/bundles/LocaleLanguages.h"
-#include "platform/linux/files/LinuxFileSystem.h"
+#include "platform/linux/device/LinuxPlatform.h"
 #include "platform/linux/files/WritableDirectory.h"
-#include "platform/linux/ipc/SocketTransport.h"
 #include "platform/linux/log/JournalLog.h"
 #include "platform/linux/log/Readiness.h"
 #include "platform/linux/log/StderrLog.h"
-#include "platform/linux/media_loader/LoadedMediaService.h"
-#include "platform/linux/notifications/LinuxNotificationCenter.h"
-#include "platform/linux/pulse/PulseAudioService.h"
-#include "platform/linux/settings/DeviceFile.h"
-#include "platform/linux/settings/JsonPreferences.h"
-#include "platform/linux/storage/VolumeWatcher.h"
 #include "platform/linux/system/InstanceLock.h"
-#include "platform/linux/system/KernelRandom.h"
 #include "platform/linux/system/Resources.h"
-#include "platform/linux/system/SystemClock.h"
 #include "platform/linux/system/TerminationSignals.h"
-#include "platform/linux/text/UnicodeTextFolding.h"
-#include "platform/linux/x11/X11RenderServer.h"
-#include "platform/linux/x11/X11Screen.h"
 #include "session/KVRecordingSession.h"
 #include "support/KVTemporaryFileStore.h"
 
@@ -37,44 +22,6 @@ namespace kelvo {
 namespace {
 
 constexpr const char* kLockPath = "/run/kelvod/lock";
-
-/// The one place that knows on which platform the daemon runs.
-Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root) {
-    Platform platform;
-    platform.processIdentifier = ::getpid();
-    platform.clock = std::make_shared<SystemClock>();
-    platform.random = std::make_shared<KernelRandom>();
-    platform.mainQueue = std::make_shared<MainQueue>(*platform.clock);
-    platform.fileSystem = std::make_shared<LinuxFileSystem>(root);
-    platform.textFolding = std::make_shared<UnicodeTextFolding>();
-    platform.languages = std::make_shared<LocaleLanguages>();
-    platform.bundles = std::make_shared<LinuxBundleService>(root, platform.languages);
-    platform.preferences = std::make_shared<JsonPreferences>(root);
-    platform.device = std::make_shared<DeviceFile>(*root, [] { return x11::nativeScreenOrientation(""); });
-    platform.notifications = std::make_shared<LinuxNotificationCenter>(root);
-    platform.storagePurge = std::make_shared<VolumeWatcher>(platform.fileSystem, platform.clock,
-                                                            KVTemporaryFileStore::_srTempPath());
-    platform.audio = std::make_shared<pulse::PulseAudioService>(platform.clock);
-    platform.calls = std::make_shared<SilentCallObserver>();
-    platform.restrictions = std::make_shared<UnrestrictedProfile>();
-    platform.displayLayout = std::make_shared<UnchangingDisplayLayout>();
-    const auto screen = std::make_shared<x11::X11Screen>("");
-    platform.screenCapture = screen;
-    platform.displayMirroring = screen;
-    platform.renderServer = std::make_shared<x11::X11RenderServer>("");
-    platform.analytics = std::make_shared<UngatheredAnalytics>();
-    platform.bulletins = std::make_shared<InvisibleBulletins>();
-    platform.media =
-        std::make_shared<LoadedMediaService>(platform.fileSystem, LoadedMediaService::usualFolders());
-    platform.ipc = std::make_shared<SocketTransport>(root, platform.bundles);
-    platform.alerts = ShellAlerts::create(platform.ipc);
-    platform.photoLibrary = std::make_shared<MissingPhotoLibrary>();
-    platform.sounds = std::make_shared<SilentSystemSounds>();
-    platform.applications = std::make_shared<UnwatchedApplications>();
-    platform.accessibility = std::make_shared<UnreadScreen>();
-    platform.inCarDisplay = std::make_shared<NoInCarDisplay>();
-    return platform;
-}
 
 int cannotStart(const std::string& reason, int status) {
     std::fprintf(stderr, "kelvod: %s\n", reason.c_str());
@@ -101,7 +48,8 @@ int run(const Options& options) {
     // A root that cannot be written is better known now than when somebody wants to record.
     const OptionalError error = makeWritableDirectory(root->hostPath(KVTemporaryFileStore::_srTempPath()));
     if (error) return cannotUseRoot(options, *error);
-    const Platform platform = linuxPlatform(root);
+    Platform platform = linuxPlatform(root, KVTemporaryFileStore::_srTempPath());
+    platform.alerts = ShellAlerts::create(platform.ipc);
 
     signals.watch([&isTerminated, mainQueue = platform.mainQueue] {
         isTerminated = true;

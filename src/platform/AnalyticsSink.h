@@ -21,8 +21,8 @@ struct AnalyticsMessage {
     Dictionary payload;
 };
 
-/// The analytics reporting service. Implemented by a Linux adapter that keeps nothing and by the simulated
-/// device, which records what it is sent. Any thread.
+/// The analytics reporting service. Implemented by a Linux adapter that keeps what it is sent in a file
+/// of the device, and by the simulated device, which records it. Any thread.
 class AnalyticsSink {
   public:
     virtual ~AnalyticsSink() = default;

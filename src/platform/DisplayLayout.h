@@ -35,8 +35,7 @@ class DisplayLayoutMonitor {
     virtual void invalidate() = 0;
 };
 
-/// Makes layout monitors. Implemented by a Linux adapter whose layout never changes and by the simulated
-/// device.
+/// Makes layout monitors. Implemented by the X11 adapter and by the simulated device.
 class DisplayLayoutService {
   public:
     virtual ~DisplayLayoutService() = default;

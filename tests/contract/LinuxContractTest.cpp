@@ -1,13 +1,16 @@
 #include "contract/BundleServiceContract.h"
 #include "contract/FileSystemContract.h"
 #include "contract/NotificationCenterContract.h"
+#include "contract/PhotoLibraryContract.h"
 #include "contract/PreferencesContract.h"
 #include "contract/TextFoldingContract.h"
 #include "platform/linux/bundles/LinuxBundleService.h"
 #include "platform/linux/bundles/LocaleLanguages.h"
 #include "platform/linux/files/LinuxFileSystem.h"
+#include "platform/linux/library/LinuxPhotoLibrary.h"
 #include "platform/linux/notifications/LinuxNotificationCenter.h"
 #include "platform/linux/settings/JsonPreferences.h"
+#include "platform/linux/system/KernelRandom.h"
 #include "platform/linux/text/UnicodeTextFolding.h"
 #include "support/TemporaryDirectory.h"
 
@@ -52,6 +55,10 @@ class LinuxWorld {
     std::int32_t livingProcess() { return ::getpid(); }
     std::int32_t missingProcess() { return std::numeric_limits<std::int32_t>::max(); }
 
+    PhotoLibrary& library() { return library_; }
+    void addMovie(const std::string& path) { addFile(path); }
+    void removeMovie(const std::string& path) { fs::remove(deviceRoot_->hostPath(path)); }
+
   private:
     static void writeTable(const fs::path& folder, const std::map<std::string, std::string>& texts) {
         fs::create_directories(folder);
@@ -72,6 +79,8 @@ class LinuxWorld {
     std::shared_ptr<const DeviceRoot> deviceRoot_ =
         std::make_shared<DeviceRoot>(root_.path(), root_.path() + "/resources");
     LinuxFileSystem fileSystem_{deviceRoot_};
+    LinuxPhotoLibrary library_{deviceRoot_, screenRecordingsFolder(*deviceRoot_),
+                               std::make_shared<KernelRandom>()};
     LinuxBundleService bundles_{deviceRoot_, std::make_shared<LocaleLanguages>("", "en_US.UTF-8")};
 };
 
@@ -141,6 +150,7 @@ INSTANTIATE_TYPED_TEST_SUITE_P(Linux, FileSystemContract, LinuxWorld);
 INSTANTIATE_TYPED_TEST_SUITE_P(Linux, BundleServiceContract, LinuxWorld);
 INSTANTIATE_TYPED_TEST_SUITE_P(Linux, PreferencesContract, LinuxPreferencesWorld);
 INSTANTIATE_TYPED_TEST_SUITE_P(Linux, NotificationCenterContract, LinuxNotificationsWorld);
+INSTANTIATE_TYPED_TEST_SUITE_P(Linux, PhotoLibraryContract, LinuxWorld);
 INSTANTIATE_TYPED_TEST_SUITE_P(Linux, TextFoldingContract, UnicodeTextFolding);
 
 }  // namespace

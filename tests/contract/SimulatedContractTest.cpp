@@ -1,6 +1,7 @@
 #include "contract/BundleServiceContract.h"
 #include "contract/FileSystemContract.h"
 #include "contract/NotificationCenterContract.h"
+#include "contract/PhotoLibraryContract.h"
 #include "contract/PreferencesContract.h"
 #include "contract/TextFoldingContract.h"
 #include "platform/simulated/SimulatedDevice.h"
@@ -41,6 +42,10 @@ class SimulatedWorld {
     NotificationCenter& center() { return *device_.notifications; }
     void post(std::string_view name, std::uint64_t state) { device_.notifications->post(name, state); }
 
+    PhotoLibrary& library() { return *device_.photoLibrary; }
+    void addMovie(const std::string& path) { device_.fileSystem->addFile(path, 1); }
+    void removeMovie(const std::string& path) { device_.fileSystem->removeItem(path); }
+
   private:
     SimulatedDevice device_;
 };
@@ -49,6 +54,7 @@ INSTANTIATE_TYPED_TEST_SUITE_P(Simulated, FileSystemContract, SimulatedWorld);
 INSTANTIATE_TYPED_TEST_SUITE_P(Simulated, BundleServiceContract, SimulatedWorld);
 INSTANTIATE_TYPED_TEST_SUITE_P(Simulated, PreferencesContract, SimulatedWorld);
 INSTANTIATE_TYPED_TEST_SUITE_P(Simulated, NotificationCenterContract, SimulatedWorld);
+INSTANTIATE_TYPED_TEST_SUITE_P(Simulated, PhotoLibraryContract, SimulatedWorld);
 INSTANTIATE_TYPED_TEST_SUITE_P(Simulated, TextFoldingContract, SimulatedTextFolding);
 
 }  // namespace

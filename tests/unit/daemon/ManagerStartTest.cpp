@@ -68,7 +68,9 @@ class ManagerStartTest : public test::ManagerFixture {
     void expectRefusal(const test::FakeRecordingSession& session, std::int64_t code, bool isUpdated) {
         EXPECT_THAT(answers, ElementsAre(Answer{code, false, false}));
         EXPECT_EQ(session.client->messages().size(), isUpdated ? 1U : 0U);
-        if (isUpdated) EXPECT_EQ(session.client->messages().front(), kUpdate);
+        if (isUpdated) {
+            EXPECT_EQ(session.client->messages().front(), kUpdate);
+        }
         EXPECT_FALSE(session.recording);
         EXPECT_EQ(session.start, nullptr);
     }
@@ -399,7 +401,9 @@ TEST_P(ManagerSoundTest, SystemRecordingIsHeardWhereItMustBe) {
     system->completeStart();
     EXPECT_EQ(device.sounds->played().size(), GetParam().isHeard ? 1U : 0U);
     manager->prepareForStoppingSession(system);
-    if (GetParam().isHeard) EXPECT_THAT(device.sounds->played(), ElementsAre(1117U, 1118U));
+    if (GetParam().isHeard) {
+        EXPECT_THAT(device.sounds->played(), ElementsAre(1117U, 1118U));
+    }
     system->recording = false;
     callFrom(10);
     accept();

@@ -1,13 +1,9 @@
 #pragma once
 
 #include "platform/Accessibility.h"
-#include "platform/AnalyticsSink.h"
-#include "platform/ApplicationState.h"
 #include "platform/BulletinService.h"
 #include "platform/CallObserver.h"
-#include "platform/DisplayLayout.h"
 #include "platform/InCarDisplay.h"
-#include "platform/PhotoLibrary.h"
 #include "platform/RestrictionsProfile.h"
 #include "platform/SystemSounds.h"
 
@@ -17,12 +13,6 @@
 /// Services that this Linux device does not have (yet): each answers as a device would on which the thing in
 /// question never happens. All are thread-safe, having no state.
 namespace kelvo {
-
-/// A device whose usage nobody gathers.
-class UngatheredAnalytics : public AnalyticsSink {
-  public:
-    OptionalError send(const AnalyticsMessage&) override { return std::nullopt; }
-};
 
 /// A device that nobody calls.
 class SilentCallObserver : public CallObserver {
@@ -36,21 +26,6 @@ class UnrestrictedProfile : public RestrictionsProfile {
     void addObserver(std::weak_ptr<RestrictionsObserver>) override {}
     void removeObserver(const RestrictionsObserver*) override {}
     RestrictionSetting effectiveSetting(std::string_view) override { return RestrictionSetting::unspecified; }
-};
-
-/// A display that shows one application, always.
-class UnchangingDisplayLayout : public DisplayLayoutService {
-  public:
-    std::shared_ptr<DisplayLayoutMonitor> createMonitor(int) override { return std::make_shared<Monitor>(); }
-
-  private:
-    class Monitor : public DisplayLayoutMonitor {
-      public:
-        DisplayLayout currentLayout() override { return {{DisplayLayout::Element{0}}}; }
-        void addObserver(std::weak_ptr<DisplayLayoutObserver>) override {}
-        void removeObserver(const DisplayLayoutObserver*) override {}
-        void invalidate() override {}
-    };
 };
 
 /// A bulletin service that shows nothing.
@@ -73,37 +48,10 @@ class InvisibleBulletins : public BulletinService {
     };
 };
 
-/// A device without a photo library.
-class MissingPhotoLibrary : public PhotoLibrary {
-  public:
-    Result<PhotoAsset> createVideoAsset(const URL&) override {
-        return KVError::posix(ENOSYS, "no photo library");
-    }
-    std::optional<PhotoAsset> assetWithLocalIdentifier(std::string_view) override { return std::nullopt; }
-    OptionalError deleteAsset(const PhotoAsset&) override { return KVError::posix(ENOENT, "no such asset"); }
-};
-
 /// A device that makes no sound of its own.
 class SilentSystemSounds : public SystemSounds {
   public:
     void playSystemSound(std::uint32_t) override {}
-};
-
-/// A device that knows nothing of its applications but that the user sees them, always.
-class UnwatchedApplications : public ApplicationStateSource {
-  public:
-    void setUpdateHandler(UpdateHandler) override {}
-    std::optional<ApplicationInformation> informationOfProcess(std::int32_t processIdentifier) override {
-        ApplicationInformation information;
-        information.state = kApplicationStateForeground;
-        information.processIdentifier = processIdentifier;
-        return information;
-    }
-    void informationOfApplication(std::string_view, InformationHandler handler) override {
-        if (handler) handler(std::nullopt);
-    }
-    std::int32_t stateOfApplication(std::string_view) override { return kApplicationStateForeground; }
-    std::optional<std::string> frontmostApplicationBundleIdentifier() override { return std::nullopt; }
 };
 
 /// A device that reads nothing to its user.

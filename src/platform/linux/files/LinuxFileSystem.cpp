@@ -1,8 +1,9 @@
 #include "platform/linux/files/LinuxFileSystem.h"
 
+#include "platform/linux/files/RenameFile.h"
+
 #include <algorithm>
 #include <cerrno>
-#include <cstdio>
 #include <fcntl.h>
 #include <filesystem>
 #include <sys/stat.h>
@@ -20,17 +21,6 @@ OptionalError errorFrom(const std::error_code& code, std::string_view path) {
 
 Date dateFrom(const statx_timestamp& time) {
     return {time.tv_sec * 1000000000LL + time.tv_nsec};
-}
-
-/// Renames without replacing; returns the errno value, 0 on success.
-int renameWithoutReplacing(const std::string& from, const std::string& to) {
-    if (::renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) return 0;
-    if (errno != EINVAL) return errno;
-    // A file system without that flag: look first. Somebody may come between, as for any two operations on
-    // one file.
-    struct stat status {};
-    if (::lstat(to.c_str(), &status) == 0) return EEXIST;
-    return std::rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;
 }
 
 /// Moves an item to another volume. What was copied is removed again when the copy fails.

@@ -6,7 +6,6 @@
 #include <memory>
 #include <mutex>
 #include <string>
-#include <vector>
 
 namespace kelvo::x11 {
 
@@ -23,11 +22,8 @@ class X11RenderServer : public RenderServer {
   private:
     bool connect();
     bool windowExists(xcb_window_t window);
-    std::optional<std::int32_t> creatorOf(xcb_window_t window);
-    xcb_window_t windowManagersWindow();
     xcb_window_t clientWithin(xcb_window_t frame);
     bool isWithin(xcb_window_t window, xcb_window_t ancestor);
-    std::vector<xcb_window_t> windowsIn(xcb_window_t window, std::string_view property);
 
     const std::string display_;
     std::mutex mutex_;

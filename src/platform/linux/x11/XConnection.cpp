@@ -72,7 +72,8 @@ void* XConnection::awaitReply(unsigned sequence) {
             return reply;
         }
         if (isBroken()) return nullptr;
-        if (!waitForInput()) {
+        if (hasGivenUp_ || !waitForInput()) {
+            hasGivenUp_ = true;
             xcb_discard_reply(connection_, sequence);
             return nullptr;
         }

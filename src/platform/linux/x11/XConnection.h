@@ -21,7 +21,8 @@ using XOwned = std::unique_ptr<Content, XFree>;
 /// A client's connection to an X server. One thread at a time; nothing of the server's outlives it.
 ///
 /// Waiting for a reply never outlasts the server: it ends, without a reply, when the connection breaks, when
-/// the interrupt descriptor becomes readable and when the time limit passes.
+/// the interrupt descriptor becomes readable and when the time limit passes. Once it ended for one of the
+/// last two reasons no reply is waited for until `tryAgain`.
 class XConnection {
   public:
     using TimeLimit = std::optional<std::chrono::milliseconds>;
@@ -40,6 +41,10 @@ class XConnection {
     xcb_window_t root() const { return screen_->root; }
 
     bool isBroken() const { return xcb_connection_has_error(connection_) != 0; }
+
+    /// Whether waiting for a reply has ended without one.
+    bool hasGivenUp() const { return hasGivenUp_; }
+    void tryAgain() { hasGivenUp_ = false; }
 
     /// Whether the server stores a pixel of a 24-bit deep picture as blue, green, red and a spare byte.
     bool drawsBGRx() const;
@@ -63,6 +68,7 @@ class XConnection {
     const xcb_screen_t* const screen_;
     const int interruptFd_;
     const TimeLimit replyLimit_;
+    bool hasGivenUp_ = false;
 };
 
 }  // namespace kelvo::x11

@@ -1,0 +1,45 @@
+#include "platform/linux/library/LinuxPhotoLibrary.h"
+
+#include "base/KVLog.h"
+#include "platform/linux/library/UserFolders.h"
+
+#include <algorithm>
+#include <cerrno>
+
+namespace kelvo {
+namespace {
+
+constexpr std::string_view kFolderName = "/Screen Recordings";
+constexpr std::string_view kVideosOfRoot = "/private/var/mobile/Media/Videos";
+
+}  // namespace
+
+Result<PhotoAsset> LinuxPhotoLibrary::createVideoAsset(const URL& movieURL) {
+    if (!movieURL.isFileURL()) return KVError::posix(EINVAL, movieURL.path());
+    const auto identifier = movies_.add(root_->hostPath(movieURL.path()));
+    if (!identifier) return identifier.error();
+    return PhotoAsset{*identifier};
+}
+
+std::optional<PhotoAsset> LinuxPhotoLibrary::assetWithLocalIdentifier(std::string_view localIdentifier) {
+    const auto movies = movies_.movies();
+    if (!movies) {
+        KVLogError("cannot read the movie library: %s", movies.error().localizedDescription().c_str());
+        return std::nullopt;
+    }
+    const bool isThere = std::ranges::any_of(
+        *movies, [&](const LibraryMovie& movie) { return movie.identifier == localIdentifier; });
+    return isThere ? std::optional(PhotoAsset{std::string(localIdentifier)}) : std::nullopt;
+}
+
+OptionalError LinuxPhotoLibrary::deleteAsset(const PhotoAsset& asset) {
+    return movies_.remove(asset.localIdentifier);
+}
+
+std::string screenRecordingsFolder(const DeviceRoot& root) {
+    const std::string videos =
+        root.root().empty() ? videosFolder(UserEnvironment::ofProcess()) : root.hostPath(kVideosOfRoot);
+    return videos + std::string(kFolderName);
+}
+
+}  // namespace kelvo
