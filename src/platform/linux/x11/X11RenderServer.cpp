@@ -26,10 +26,8 @@ std::optional<std::int32_t> X11RenderServer::processIdentifierOfContext(std::uin
 }
 
 bool X11RenderServer::connect() {
-    if (connection_ && !connection_->isBroken()) {
-        connection_->tryAgain();
-        return true;
-    }
+    // A server that stands still would let what it is asked pile up.
+    if (connection_ && !connection_->isBroken() && !connection_->hasGivenUp()) return true;
     connection_ = XConnection::open(display_, -1, kReplyLimit);
     if (!connection_ || !connection_->hasExtension(xcb_res_id)) return false;
     return connection_->await<xcb_res_query_version_reply_t>(

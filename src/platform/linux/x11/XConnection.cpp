@@ -1,5 +1,7 @@
 #include "platform/linux/x11/XConnection.h"
 
+#include "platform/linux/x11/XAttempt.h"
+
 #include <array>
 #include <cerrno>
 #include <poll.h>
@@ -7,6 +9,8 @@
 
 namespace kelvo::x11 {
 namespace {
+
+constexpr std::chrono::seconds kConnectionLimit{5};
 
 const xcb_screen_t* screenAt(xcb_connection_t* connection, int number) {
     auto screens = xcb_setup_roots_iterator(xcb_get_setup(connection));
@@ -19,9 +23,9 @@ const xcb_screen_t* screenAt(xcb_connection_t* connection, int number) {
 
 std::unique_ptr<XConnection> XConnection::open(const std::string& display, int interruptFd,
                                                TimeLimit replyLimit) {
-    int screenNumber = 0;
-    xcb_connection_t* const connection =
-        xcb_connect(display.empty() ? nullptr : display.c_str(), &screenNumber);
+    const auto [connection, screenNumber] =
+        connectWithin(display, replyLimit.value_or(kConnectionLimit), interruptFd);
+    if (connection == nullptr) return nullptr;
     const bool isConnected = xcb_connection_has_error(connection) == 0;
     const xcb_screen_t* const screen = isConnected ? screenAt(connection, screenNumber) : nullptr;
     if (screen == nullptr) {
@@ -51,7 +55,10 @@ bool XConnection::drawsBGRx() const {
     return false;
 }
 
-bool XConnection::hasExtension(xcb_extension_t& extension) const {
+bool XConnection::hasExtension(xcb_extension_t& extension) {
+    // Asked ahead and awaited our way: libxcb's own wait for the answer could not be interrupted.
+    xcb_prefetch_extension_data(connection_, &extension);
+    if (!await<xcb_get_input_focus_reply_t>(xcb_get_input_focus(connection_))) return false;
     const xcb_query_extension_reply_t* const reply = xcb_get_extension_data(connection_, &extension);
     return reply != nullptr && reply->present != 0;
 }

@@ -28,7 +28,8 @@ class XConnection {
     using TimeLimit = std::optional<std::chrono::milliseconds>;
 
     /// Connects to `display` (":0"; empty takes $DISPLAY). `interruptFd` is -1 or outlives the connection.
-    /// None when the display cannot be reached.
+    /// None when the display cannot be reached or does not answer within the limit (five seconds without
+    /// one).
     static std::unique_ptr<XConnection> open(const std::string& display, int interruptFd = -1,
                                              TimeLimit replyLimit = std::nullopt);
 
@@ -48,7 +49,8 @@ class XConnection {
 
     /// Whether the server stores a pixel of a 24-bit deep picture as blue, green, red and a spare byte.
     bool drawsBGRx() const;
-    bool hasExtension(xcb_extension_t& extension) const;
+    /// Also false when waiting ended without an answer.
+    bool hasExtension(xcb_extension_t& extension);
 
     /// The reply to a request; none when the request failed or waiting ended.
     template <typename Reply, typename Cookie>
