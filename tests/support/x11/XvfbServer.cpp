@@ -5,13 +5,14 @@
 
 namespace kelvo::test {
 
-XvfbServer::XvfbServer(int width, int height, const std::string& display) {
+XvfbServer::XvfbServer(int width, int height, const std::string& display, const std::string& options) {
     // Servers that start at once race to make the folder of their sockets.
     ::mkdir("/tmp/.X11-unix", 01777);
     ::chmod("/tmp/.X11-unix", 01777);
     // The server writes its number, and nothing else, to where the test reads.
     const std::string command = "exec Xvfb " + display + " -displayfd 3 -screen 0 " + std::to_string(width) +
-                                "x" + std::to_string(height) + "x24 -nolisten tcp -noreset 3>&2 2>/dev/null";
+                                "x" + std::to_string(height) + "x24 -nolisten tcp -noreset " + options +
+                                " 3>&2 2>/dev/null";
     process_ = std::make_unique<ChildProcess>(std::vector<std::string>{"sh", "-c", command});
     if (!process_->waitForLine("\n")) return;
     const std::string& answer = process_->output();

@@ -11,8 +11,8 @@ namespace kelvo::test {
 class XvfbServer {
   public:
     /// Starts a server whose screen has this size and waits until it answers. `display` is ":N" to use that
-    /// number, or empty to take a free one.
-    XvfbServer(int width, int height, const std::string& display = {});
+    /// number, or empty to take a free one; `options` are further ones of the program.
+    XvfbServer(int width, int height, const std::string& display = {}, const std::string& options = {});
 
     /// ":N"; empty when the server did not come up.
     const std::string& display() const { return display_; }
