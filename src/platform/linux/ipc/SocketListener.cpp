@@ -177,7 +177,7 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
     const std::shared_ptr<Guarded<OpenConnections>> open_ = std::make_shared<Guarded<OpenConnections>>();
     std::recursive_mutex mutex_;  // a listener stays while its delegate decides, and the delegate may drop it
     SocketListener* listener_ = nullptr;
-    UniqueFd socket_;  // set before it is opened, and kept
+    UniqueFd socket_;                       // set before it is opened, and kept
     std::atomic<bool> isInherited_{false};  // the service manager listens on when this process is gone
     SocketLoop::Token token_ = 0;
     UniqueFd spare_ = openNothing();  // given up to accept, and end, what cannot be kept
