@@ -48,10 +48,13 @@ SystemAlertContent KVRecordingManager::acknowledgementAlert(const RecordingSessi
     SystemAlertContent content = acknowledgementButtons(isBroadcast);
     const std::string name =
         localization_->kvLocalizedAppNameFromBundleID(session.bundleID()).value_or(std::string());
-    const std::string kind =
-        session.isCapturing() ? "ACKNOWLEDGEMENT_CAPTURE_ALERT" : acknowledgementKey(isBroadcast, "ALERT");
-    content.header = formatLocalized(localized(kind + "_TITLE"), name);
-    content.message = localized(kind + "_BODY");
+    if (session.isCapturing()) {
+        content.header = formatLocalized(localized("ACKNOWLEDGEMENT_CAPTURE_ALERT_TITLE"), name);
+        content.message = localized("ACKNOWLEDGEMENT_CAPTURE_ALERT_BODY");
+    } else {
+        content.header = formatLocalized(localized(acknowledgementKey(isBroadcast, "ALERT_TITLE")), name);
+        content.message = localized(acknowledgementKey(isBroadcast, "ALERT_BODY"));
+    }
     if (cameraRecording_ || microphoneRecording_) {
         // Plain recordings have no sentence for the microphone alone: the one about the camera serves.
         const bool isAboutMicrophone = isBroadcast && !cameraRecording_;

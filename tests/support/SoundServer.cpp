@@ -1,5 +1,7 @@
 #include "SoundServer.h"
 
+#include "Eventually.h"
+
 #include <cmath>
 #include <csignal>
 #include <cstdlib>
@@ -10,6 +12,9 @@
 
 namespace kelvo::test {
 namespace {
+
+/// With which a server that starts on a busy machine is waited for.
+constexpr std::chrono::seconds kPatience{30};
 
 /// One minute of a sine as raw little-endian samples.
 std::string sine(int frequency) {
@@ -47,11 +52,8 @@ bool SoundServer::start() {
             "module-null-sink sink_name=micfeed rate=44100 norewinds=1", "-L",
             "module-remap-source source_name=mic master=micfeed.monitor"},
         std::map<std::string, std::string>{{"XDG_RUNTIME_DIR", folder_.path()}});
-    for (int attempt = 0; attempt < 100; ++attempt) {
-        if (control("info")) return control("set-default-source mic") && control("set-default-sink speaker");
-        ChildProcess({"sleep", "0.05"}).waitForExit();
-    }
-    return false;
+    return eventually([&] { return control("info"); }, kPatience) && control("set-default-source mic") &&
+           control("set-default-sink speaker");
 }
 
 void SoundServer::kill() {
@@ -59,11 +61,11 @@ void SoundServer::kill() {
 }
 
 bool SoundServer::control(const std::string& command) const {
-    return ChildProcess({"sh", "-c", "timeout 5 pactl " + command + " >/dev/null 2>&1"}).waitForExit() == 0;
+    return ChildProcess({"sh", "-c", "timeout 20 pactl " + command + " >/dev/null 2>&1"}).waitForExit() == 0;
 }
 
 std::string SoundServer::answer(const std::string& command) const {
-    ChildProcess client({"sh", "-c", "timeout 5 pactl " + command + " >&2"});
+    ChildProcess client({"sh", "-c", "timeout 20 pactl " + command + " >&2"});
     client.waitForExit();
     return client.output();
 }
@@ -76,7 +78,7 @@ std::unique_ptr<ChildProcess> SoundServer::play(int frequency, const std::string
     if (process) environment["PULSE_PROP"] = "application.process.id=" + std::to_string(*process);
     return std::make_unique<ChildProcess>(
         std::vector<std::string>{"pacat", "--playback", "--raw", "--rate=44100", "--channels=1",
-                                 "--format=s16le", "--latency-msec=50", "--device=" + sink,
+                                 "--format=s16le", "--latency-msec=200", "--device=" + sink,
                                  folder_.path() + "/" + name},
         environment);
 }
