@@ -18,6 +18,8 @@ struct Callback {
     std::string failureText;    // empty: nothing is sent
     std::string fanOutText;     // empty: nothing is logged by the multiple proxy
     std::string fanOutFailure;  // empty: nothing is sent by the multiple proxy
+
+    friend void PrintTo(const Callback& callback, std::ostream* out) { *out << callback.name; }
 };
 
 std::vector<Callback> callbacks() {
