@@ -4,6 +4,7 @@
 #include "platform/simulated/SimulatedDevice.h"
 #include "support/ChildProcess.h"
 #include "support/Eventually.h"
+#include "support/x11/WindowManager.h"
 #include "support/x11/XClient.h"
 #include "support/x11/XvfbServer.h"
 
@@ -28,14 +29,6 @@ class X11ApplicationsTest : public testing::Test {
     }
     ~X11ApplicationsTest() override { applications_.setUpdateHandler(nullptr); }
 
-    std::unique_ptr<test::ChildProcess> startManager() {
-        auto manager = std::make_unique<test::ChildProcess>(
-            std::vector<std::string>{"openbox"},
-            std::map<std::string, std::string>{{"DISPLAY", server_.display()}});
-        const auto connection = XConnection::open(server_.display());
-        EXPECT_TRUE(eventually([&] { return windowManagersWindow(*connection) != XCB_NONE; }));
-        return manager;
-    }
     /// Starts the other application with one window; its bundle is "other".
     std::unique_ptr<test::ChildProcess> startOther(const std::string& geometry) {
         auto other = std::make_unique<test::ChildProcess>(
@@ -70,7 +63,7 @@ class X11ApplicationsTest : public testing::Test {
     }
 
     SimulatedDevice device_;
-    test::XvfbServer server_{400, 300};
+    test::XvfbServer server_{400, 300, test::XvfbServer::ownDisplay()};
     test::XClient client_{server_.display()};
     X11Applications applications_{server_.display(), device_.bundles};
     std::shared_ptr<Guarded<std::vector<ApplicationInformation>>> updates_ =
@@ -85,7 +78,8 @@ TEST_F(X11ApplicationsTest, EmptyDisplayHasNoApplications) {
 }
 
 TEST_F(X11ApplicationsTest, ApplicationWithTheInputIsFrontmost) {
-    const auto manager = startManager();
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     client_.createWindow({0, 0, 50, 50}, 0, true);
     ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
     EXPECT_EQ(applications_.frontmostApplicationBundleIdentifier(), "own");
@@ -96,7 +90,8 @@ TEST_F(X11ApplicationsTest, ApplicationWithTheInputIsFrontmost) {
 }
 
 TEST_F(X11ApplicationsTest, ApplicationThatAnotherOneTookTheInputFromIsObscured) {
-    const auto manager = startManager();
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     client_.createWindow({0, 0, 50, 50}, 0, true);
     ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
     watch();
@@ -108,7 +103,8 @@ TEST_F(X11ApplicationsTest, ApplicationThatAnotherOneTookTheInputFromIsObscured)
 }
 
 TEST_F(X11ApplicationsTest, ApplicationWithoutVisibleWindowsIsInTheBackground) {
-    const auto manager = startManager();
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     const auto window = client_.createWindow({0, 0, 50, 50}, 0, true);
     ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
     watch();
@@ -117,7 +113,8 @@ TEST_F(X11ApplicationsTest, ApplicationWithoutVisibleWindowsIsInTheBackground) {
 }
 
 TEST_F(X11ApplicationsTest, MinimizedApplicationIsInTheBackground) {
-    const auto manager = startManager();
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     const auto window = client_.createWindow({0, 0, 50, 50}, 0, true);
     ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
     watch();
@@ -128,7 +125,8 @@ TEST_F(X11ApplicationsTest, MinimizedApplicationIsInTheBackground) {
 }
 
 TEST_F(X11ApplicationsTest, ApplicationThatEndsIsTerminated) {
-    const auto manager = startManager();
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     const auto other = startOther("60x60+100+100");
     watch();
     other->signal(SIGKILL);
