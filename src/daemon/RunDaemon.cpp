@@ -2,6 +2,7 @@
 
 #include "base/KVLog.h"
 #include "daemon/KVRecordingManager.h"
+#include "daemon/LibraryService.h"
 
 #include <utility>
 
@@ -16,6 +17,8 @@ std::shared_ptr<KVRecordingManager> theRecordingManager;
 int runDaemon(const Platform& platform, SessionFactory createSession, const std::function<void()>& ready) {
     KVLog("kelvod Starting!");
     theRecordingManager = KVRecordingManager::create(platform, std::move(createSession));
+    // Before the first client, who might fill the store.
+    const auto library = LibraryService::create(platform);
     theRecordingManager->finishStartup();
     if (ready) ready();
     platform.mainQueue->run();

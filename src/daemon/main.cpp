@@ -48,7 +48,7 @@ int run(const Options& options) {
     // A root that cannot be written is better known now than when somebody wants to record.
     const OptionalError error = makeWritableDirectory(root->hostPath(KVTemporaryFileStore::_srTempPath()));
     if (error) return cannotUseRoot(options, *error);
-    Platform platform = linuxPlatform(root, KVTemporaryFileStore::_srTempPath());
+    Platform platform = linuxPlatform(root, KVTemporaryFileStore::_srTempPath(), options.savesToUsersVideos);
     platform.alerts = ShellAlerts::create(platform.ipc);
 
     signals.watch([&isTerminated, mainQueue = platform.mainQueue] {
