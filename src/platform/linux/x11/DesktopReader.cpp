@@ -46,9 +46,7 @@ struct DesktopReader::Context {
 };
 
 std::optional<DesktopReader> DesktopReader::open(XConnection& connection) {
-    if (!connection.hasExtension(xcb_res_id)) return std::nullopt;
-    if (!connection.await<xcb_res_query_version_reply_t>(xcb_res_query_version(connection.raw(), 1, 2)))
-        return std::nullopt;
+    if (!canTellCreators(connection)) return std::nullopt;
     return DesktopReader(connection);
 }
 

@@ -72,6 +72,7 @@ void DesktopWatch::watch(const Handler& handler) {
     bool isReachable = true;
     while (!isStopping_) {
         if (!connect()) {
+            if (!wait(0)) return;
             if (std::exchange(isReachable, false))
                 KVLogError("cannot reach the display; what it shows is unknown until it is there");
             report({}, handler);
@@ -105,7 +106,7 @@ std::optional<DesktopView> DesktopWatch::look() {
 }
 
 bool DesktopWatch::connect() {
-    if (connection_ && !connection_->isBroken()) {
+    if (reader_ && !connection_->isBroken()) {
         connection_->tryAgain();
         return true;
     }

@@ -1,6 +1,6 @@
 #include "platform/linux/x11/XConnection.h"
 
-#include "platform/linux/x11/XAttempt.h"
+#include "platform/linux/x11/XHandshake.h"
 
 #include <array>
 #include <cerrno>
@@ -9,8 +9,6 @@
 
 namespace kelvo::x11 {
 namespace {
-
-constexpr std::chrono::seconds kConnectionLimit{5};
 
 const xcb_screen_t* screenAt(xcb_connection_t* connection, int number) {
     auto screens = xcb_setup_roots_iterator(xcb_get_setup(connection));
@@ -21,13 +19,20 @@ const xcb_screen_t* screenAt(xcb_connection_t* connection, int number) {
 
 }  // namespace
 
+std::unique_ptr<XConnection> XConnection::open(const std::string& display) {
+    return open(display, -1, kReplyLimit);
+}
+
+std::unique_ptr<XConnection> XConnection::open(const std::string& display, int interruptFd) {
+    return open(display, interruptFd, std::nullopt);
+}
+
 std::unique_ptr<XConnection> XConnection::open(const std::string& display, int interruptFd,
                                                TimeLimit replyLimit) {
-    const auto [connection, screenNumber] =
-        connectWithin(display, replyLimit.value_or(kConnectionLimit), interruptFd);
+    int screenNumber = 0;
+    xcb_connection_t* const connection = connectTo(display, screenNumber, interruptFd, replyLimit);
     if (connection == nullptr) return nullptr;
-    const bool isConnected = xcb_connection_has_error(connection) == 0;
-    const xcb_screen_t* const screen = isConnected ? screenAt(connection, screenNumber) : nullptr;
+    const xcb_screen_t* const screen = screenAt(connection, screenNumber);
     if (screen == nullptr) {
         xcb_disconnect(connection);
         return nullptr;
@@ -56,7 +61,7 @@ bool XConnection::drawsBGRx() const {
 }
 
 bool XConnection::hasExtension(xcb_extension_t& extension) {
-    // Asked ahead and awaited our way: libxcb's own wait for the answer could not be interrupted.
+    // Asked ahead and awaited our way: libxcb's own wait for the answer could not be ended.
     xcb_prefetch_extension_data(connection_, &extension);
     if (!await<xcb_get_input_focus_reply_t>(xcb_get_input_focus(connection_))) return false;
     const xcb_query_extension_reply_t* const reply = xcb_get_extension_data(connection_, &extension);

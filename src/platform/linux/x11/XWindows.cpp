@@ -7,6 +7,13 @@ constexpr std::uint32_t kMostItems = 4096;
 
 }  // namespace
 
+bool canTellCreators(XConnection& connection) {
+    if (!connection.hasExtension(xcb_res_id)) return false;
+    const auto version =
+        connection.await<xcb_res_query_version_reply_t>(xcb_res_query_version(connection.raw(), 1, 2));
+    return version != nullptr;
+}
+
 std::optional<std::int32_t> creatorOf(XConnection& connection, xcb_window_t window) {
     return creatorIn(connection, askCreator(connection, window));
 }
