@@ -12,6 +12,7 @@
 namespace kelvo {
 
 /// A folder with an `Info.json`: an application, a framework, an extension or a module of the system shell.
+/// Or an application that a desktop knows by a file of its own, which then stands for the folder.
 /// Immutable once opened but for its string tables, which are read when they are asked for; thread-safe.
 class Bundle {
   public:
@@ -29,6 +30,9 @@ class Bundle {
     virtual std::optional<std::string> name() const = 0;
     virtual std::optional<std::string> displayName() const = 0;
     virtual std::optional<std::string> localizedDisplayName() const = 0;
+
+    /// The path of the bundle's icon, an image file; none when it has none.
+    virtual std::optional<std::string> iconPath() const = 0;
 
     /// The names of the bundle's `*.lproj` folders ("en", "zh-Hans"), in alphabetical order.
     virtual std::vector<std::string> localizations() const = 0;

@@ -18,6 +18,7 @@ class SimulatedBundle : public Bundle {
     std::optional<std::string> name() const override { return content_.name; }
     std::optional<std::string> displayName() const override { return content_.displayName; }
     std::optional<std::string> localizedDisplayName() const override { return content_.localizedDisplayName; }
+    std::optional<std::string> iconPath() const override { return content_.iconPath; }
     Dictionary entitlements() const override { return content_.entitlements; }
 
     std::vector<std::string> localizations() const override {

@@ -13,6 +13,7 @@ struct SimulatedBundleContent {
     std::optional<std::string> name;
     std::optional<std::string> displayName;
     std::optional<std::string> localizedDisplayName;
+    std::optional<std::string> iconPath;
     Dictionary entitlements;
     std::string developmentLanguage = "en";
     /// String tables by localization, table and key. The localization "" is a bundle of one localization's

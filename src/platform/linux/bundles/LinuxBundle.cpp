@@ -1,6 +1,7 @@
 #include "platform/linux/bundles/LinuxBundle.h"
 
 #include "base/KVLog.h"
+#include "platform/linux/bundles/LocaleLanguages.h"
 #include "platform/linux/bundles/StringsTable.h"
 #include "platform/linux/files/ReadFile.h"
 
@@ -57,13 +58,15 @@ LinuxBundle::LinuxBundle(std::string hostFolder, std::string devicePath, BundleI
       languages_(std::move(languages)) {}
 
 std::optional<std::string> LinuxBundle::localizedDisplayName() const {
-    std::vector<std::string> tags;
-    for (const auto& [tag, name] : info_.localizedNames)
-        tags.push_back(tag);
-    const auto chosen = preferredLocalizations(tags, languages_->preferredLanguages());
-    if (chosen.empty()) return std::nullopt;
-    const std::string* name = info_.localizedNames.find(chosen.front())->asString();
-    return name != nullptr ? std::optional(*name) : std::nullopt;
+    return nameForUser(info_.localizedNames, *languages_);
+}
+
+std::optional<std::string> LinuxBundle::iconPath() const {
+    const fs::path icon = fs::path(info_.icon).lexically_normal();
+    std::error_code ignored;
+    const bool isInside = !icon.empty() && icon.is_relative() && *icon.begin() != "..";
+    if (!isInside || !fs::is_regular_file(hostFolder_ / icon, ignored)) return std::nullopt;
+    return devicePath_ + "/" + icon.string();
 }
 
 std::vector<std::string> LinuxBundle::localizations() const {

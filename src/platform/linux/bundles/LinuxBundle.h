@@ -24,6 +24,7 @@ class LinuxBundle : public Bundle {
     std::optional<std::string> name() const override { return info_.name; }
     std::optional<std::string> displayName() const override { return info_.displayName; }
     std::optional<std::string> localizedDisplayName() const override;
+    std::optional<std::string> iconPath() const override;
     std::vector<std::string> localizations() const override;
     std::optional<std::string> pathForResource(std::string_view name, std::string_view type,
                                                std::string_view localization) const override;

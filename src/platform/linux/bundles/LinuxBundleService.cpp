@@ -1,5 +1,6 @@
 #include "platform/linux/bundles/LinuxBundleService.h"
 
+#include "platform/linux/bundles/DesktopBundle.h"
 #include "platform/linux/bundles/LinuxBundle.h"
 
 #include <array>
@@ -13,6 +14,7 @@ namespace {
 
 namespace fs = std::filesystem;
 
+constexpr std::string_view kDesktopSuffix = ".desktop";
 constexpr std::size_t kLongestPath = 4096;
 constexpr std::array<std::string_view, 4> kBundleFolders{"/Applications", "/System/Applications",
                                                          "/System/Library/Frameworks",
@@ -40,6 +42,9 @@ bool isSameFile(const std::string& left, const std::string& right) {
 }  // namespace
 
 BundleRef LinuxBundleService::bundleAtPath(std::string_view path) {
+    if (path.ends_with(kDesktopSuffix)) {
+        if (const auto entry = desktop_.inFile(root_->hostPath(path))) return bundleOfEntry(entry);
+    }
     return LinuxBundle::open(root_->hostPathForReading(path), std::string(path), languages_);
 }
 
@@ -48,7 +53,16 @@ BundleRef LinuxBundleService::bundleWithIdentifier(std::string_view bundleIdenti
     for (const std::string_view folder : kBundleFolders) {
         if (BundleRef bundle = bundleInFolder(root_->hostPath(folder), bundleIdentifier)) return bundle;
     }
-    return bundleInFolder(root_->resourceFolder(), bundleIdentifier);
+    if (BundleRef bundle = bundleInFolder(root_->resourceFolder(), bundleIdentifier)) return bundle;
+    const auto entry = desktop_.withIdentifier(bundleIdentifier);
+    return entry ? bundleOfEntry(entry) : nullptr;
+}
+
+BundleRef LinuxBundleService::bundleOfEntry(const DesktopApplicationEntryRef& entry) const {
+    const std::string icon = iconFile(desktop_.folders(), entry->file.icon);
+    return std::make_shared<DesktopBundle>(
+        entry, root_->devicePath(entry->hostFile),
+        icon.empty() ? std::nullopt : std::optional(root_->devicePath(icon)), languages_);
 }
 
 BundleRef LinuxBundleService::bundleInFolder(const std::string& hostFolder,
@@ -81,7 +95,8 @@ std::optional<std::string> LinuxBundleService::folderOfBundleOwning(std::string_
         if (fs::exists(folder / kInfoFileName, ignored)) return root_->devicePath(folder.string());
         folder = folder.parent_path();
     }
-    return std::nullopt;
+    const auto entry = desktop_.ofProgram(executablePath);
+    return entry ? std::optional(root_->devicePath(entry->hostFile)) : std::nullopt;
 }
 
 }  // namespace kelvo

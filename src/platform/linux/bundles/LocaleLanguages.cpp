@@ -56,4 +56,14 @@ LocaleLanguages::LocaleLanguages(std::string_view languageList, std::string_view
     if (languages_.empty()) languages_.push_back("en");
 }
 
+std::optional<std::string> nameForUser(const Dictionary& names, Languages& languages) {
+    std::vector<std::string> tags;
+    for (const auto& [tag, name] : names)
+        tags.push_back(tag);
+    const auto chosen = preferredLocalizations(tags, languages.preferredLanguages());
+    if (chosen.empty()) return std::nullopt;
+    const std::string* const name = names.find(chosen.front())->asString();
+    return name != nullptr ? std::optional(*name) : std::nullopt;
+}
+
 }  // namespace kelvo

@@ -25,4 +25,7 @@ class LocaleLanguages : public Languages {
 /// ("zh_CN" is "zh-Hans-CN"). Empty for "C", "POSIX" and what is no locale's name.
 std::string languageTag(std::string_view localeName);
 
+/// The one of `names`, by language tag, that serves a user of `languages` best; none when there is none.
+std::optional<std::string> nameForUser(const Dictionary& names, Languages& languages);
+
 }  // namespace kelvo

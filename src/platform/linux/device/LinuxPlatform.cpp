@@ -35,7 +35,8 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root, const std:
     platform.fileSystem = std::make_shared<LinuxFileSystem>(root);
     platform.textFolding = std::make_shared<UnicodeTextFolding>();
     platform.languages = std::make_shared<LocaleLanguages>();
-    platform.bundles = std::make_shared<LinuxBundleService>(root, platform.languages);
+    platform.bundles =
+        std::make_shared<LinuxBundleService>(root, platform.languages, DesktopFolders::ofProcess());
     platform.preferences = std::make_shared<JsonPreferences>(root);
     platform.device = std::make_shared<DeviceFile>(*root, [] { return x11::nativeScreenOrientation(""); });
     platform.notifications = std::make_shared<LinuxNotificationCenter>(root);
