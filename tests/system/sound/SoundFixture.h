@@ -44,6 +44,10 @@ class Track {
         std::unique_lock lock(mutex_);
         return grows_.wait_for(lock, 20s, [&] { return isEnough(samples_); });
     }
+    void clear() {
+        const std::lock_guard lock(mutex_);
+        samples_.clear();
+    }
     std::vector<SampleBufferRef> all() {
         const std::lock_guard lock(mutex_);
         return samples_;

@@ -5,7 +5,6 @@
 #include "platform/CallObserver.h"
 #include "platform/InCarDisplay.h"
 #include "platform/RestrictionsProfile.h"
-#include "platform/SystemSounds.h"
 
 #include <cerrno>
 #include <memory>
@@ -47,12 +46,6 @@ class InvisibleBulletins : public BulletinService {
             return std::make_shared<Proxy>();
         }
     };
-};
-
-/// A device that makes no sound of its own.
-class SilentSystemSounds : public SystemSounds {
-  public:
-    void playSystemSound(std::uint32_t) override {}
 };
 
 /// A device that reads nothing to its user.

@@ -12,6 +12,7 @@
 #include "platform/linux/pulse/PulseAudioService.h"
 #include "platform/linux/settings/DeviceFile.h"
 #include "platform/linux/settings/JsonPreferences.h"
+#include "platform/linux/sounds/PulseSystemSounds.h"
 #include "platform/linux/storage/VolumeWatcher.h"
 #include "platform/linux/system/KernelRandom.h"
 #include "platform/linux/system/SystemClock.h"
@@ -56,7 +57,7 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root, const std:
     platform.ipc = std::make_shared<SocketTransport>(root, platform.bundles);
     platform.photoLibrary = std::make_shared<LinuxPhotoLibrary>(
         root, screenRecordingsFolder(*root, savesToUsersVideos), platform.random);
-    platform.sounds = std::make_shared<SilentSystemSounds>();
+    platform.sounds = std::make_shared<PulseSystemSounds>(root);
     platform.applications = std::make_shared<x11::X11Applications>("", platform.bundles);
     platform.accessibility = std::make_shared<UnreadScreen>();
     platform.inCarDisplay = std::make_shared<NoInCarDisplay>();
