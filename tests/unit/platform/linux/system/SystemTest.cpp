@@ -1,3 +1,4 @@
+#include "platform/linux/system/DescriptorLimit.h"
 #include "platform/linux/system/InstanceLock.h"
 #include "platform/linux/system/KernelRandom.h"
 #include "platform/linux/system/Resources.h"
@@ -12,6 +13,7 @@
 #include <ctime>
 #include <filesystem>
 #include <future>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -99,6 +101,18 @@ TEST(NoTerminationSignalTest, WithoutASignalTheHandlerNeverRuns) {
                   TerminationSignals signals;
                   signals.watch([] { ::_exit(1); });
                   return 0;
+              }),
+              0);
+}
+
+TEST(DescriptorLimitTest, IsRaisedAsFarAsItMayBe) {
+    EXPECT_EQ(exitStatusOf([] {
+                  const rlimit low{200, 500};
+                  ::setrlimit(RLIMIT_NOFILE, &low);
+                  raiseDescriptorLimit();
+                  rlimit raised{};
+                  ::getrlimit(RLIMIT_NOFILE, &raised);
+                  return raised.rlim_cur == 500 && raised.rlim_max == 500 ? 0 : 1;
               }),
               0);
 }
