@@ -2,10 +2,18 @@
 
 #include <csignal>
 #include <sys/stat.h>
+#include <unistd.h>
 
 namespace kelvo::test {
 
-XvfbServer::XvfbServer(int width, int height, const std::string& display, const std::string& options) {
+std::string XvfbServer::ownDisplay() {
+    constexpr int kFirst = 9000;
+    constexpr int kCount = 50000;
+    return ":" + std::to_string(kFirst + ::getpid() % kCount);
+}
+
+XvfbServer::XvfbServer(int width, int height, const std::string& display, const std::string& options)
+    : isNumberOurs_(!display.empty()) {
     // Servers that start at once race to make the folder of their sockets.
     ::mkdir("/tmp/.X11-unix", 01777);
     ::chmod("/tmp/.X11-unix", 01777);
@@ -17,6 +25,15 @@ XvfbServer::XvfbServer(int width, int height, const std::string& display, const 
     if (!process_->waitForLine("\n")) return;
     const std::string& answer = process_->output();
     display_ = ":" + answer.substr(0, answer.find('\n'));
+}
+
+XvfbServer::~XvfbServer() {
+    process_.reset();
+    if (!isNumberOurs_ || display_.empty()) return;
+    // It was killed; the files of other numbers may be those of a new server by now.
+    const std::string number = display_.substr(1);
+    ::unlink(("/tmp/.X11-unix/X" + number).c_str());
+    ::unlink(("/tmp/.X" + number + "-lock").c_str());
 }
 
 void XvfbServer::kill() {

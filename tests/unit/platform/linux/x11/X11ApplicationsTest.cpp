@@ -1,9 +1,11 @@
 #include "platform/linux/x11/X11Applications.h"
 #include "platform/linux/x11/X11DisplayLayout.h"
-#include "platform/linux/x11/XWindows.h"
+#include "platform/linux/x11/X11RenderServer.h"
+#include "platform/linux/x11/XConnection.h"
 #include "platform/simulated/SimulatedDevice.h"
 #include "support/ChildProcess.h"
 #include "support/Eventually.h"
+#include "support/x11/WindowManager.h"
 #include "support/x11/XClient.h"
 #include "support/x11/XvfbServer.h"
 
@@ -28,14 +30,6 @@ class X11ApplicationsTest : public testing::Test {
     }
     ~X11ApplicationsTest() override { applications_.setUpdateHandler(nullptr); }
 
-    std::unique_ptr<test::ChildProcess> startManager() {
-        auto manager = std::make_unique<test::ChildProcess>(
-            std::vector<std::string>{"openbox"},
-            std::map<std::string, std::string>{{"DISPLAY", server_.display()}});
-        const auto connection = XConnection::open(server_.display());
-        EXPECT_TRUE(eventually([&] { return windowManagersWindow(*connection) != XCB_NONE; }));
-        return manager;
-    }
     /// Starts the other application with one window; its bundle is "other".
     std::unique_ptr<test::ChildProcess> startOther(const std::string& geometry) {
         auto other = std::make_unique<test::ChildProcess>(
@@ -50,6 +44,12 @@ class X11ApplicationsTest : public testing::Test {
         SimulatedBundleContent content;
         content.bundleIdentifier = identifier;
         device_.bundles->addBundle(path, std::move(content));
+    }
+    std::vector<xcb_window_t> topLevelWindows() {
+        const XOwned<xcb_query_tree_reply_t> tree(
+            xcb_query_tree_reply(client_.raw(), xcb_query_tree(client_.raw(), client_.root()), nullptr));
+        const xcb_window_t* const children = xcb_query_tree_children(tree.get());
+        return {children, children + xcb_query_tree_children_length(tree.get())};
     }
     std::int32_t ownState() { return applications_.stateOfApplication("own"); }
 
@@ -70,7 +70,7 @@ class X11ApplicationsTest : public testing::Test {
     }
 
     SimulatedDevice device_;
-    test::XvfbServer server_{400, 300};
+    test::XvfbServer server_{400, 300, test::XvfbServer::ownDisplay()};
     test::XClient client_{server_.display()};
     X11Applications applications_{server_.display(), device_.bundles};
     std::shared_ptr<Guarded<std::vector<ApplicationInformation>>> updates_ =
@@ -85,7 +85,8 @@ TEST_F(X11ApplicationsTest, EmptyDisplayHasNoApplications) {
 }
 
 TEST_F(X11ApplicationsTest, ApplicationWithTheInputIsFrontmost) {
-    const auto manager = startManager();
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     client_.createWindow({0, 0, 50, 50}, 0, true);
     ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
     EXPECT_EQ(applications_.frontmostApplicationBundleIdentifier(), "own");
@@ -96,7 +97,8 @@ TEST_F(X11ApplicationsTest, ApplicationWithTheInputIsFrontmost) {
 }
 
 TEST_F(X11ApplicationsTest, ApplicationThatAnotherOneTookTheInputFromIsObscured) {
-    const auto manager = startManager();
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     client_.createWindow({0, 0, 50, 50}, 0, true);
     ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
     watch();
@@ -108,7 +110,8 @@ TEST_F(X11ApplicationsTest, ApplicationThatAnotherOneTookTheInputFromIsObscured)
 }
 
 TEST_F(X11ApplicationsTest, ApplicationWithoutVisibleWindowsIsInTheBackground) {
-    const auto manager = startManager();
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     const auto window = client_.createWindow({0, 0, 50, 50}, 0, true);
     ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
     watch();
@@ -117,7 +120,8 @@ TEST_F(X11ApplicationsTest, ApplicationWithoutVisibleWindowsIsInTheBackground) {
 }
 
 TEST_F(X11ApplicationsTest, MinimizedApplicationIsInTheBackground) {
-    const auto manager = startManager();
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     const auto window = client_.createWindow({0, 0, 50, 50}, 0, true);
     ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
     watch();
@@ -128,7 +132,8 @@ TEST_F(X11ApplicationsTest, MinimizedApplicationIsInTheBackground) {
 }
 
 TEST_F(X11ApplicationsTest, ApplicationThatEndsIsTerminated) {
-    const auto manager = startManager();
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     const auto other = startOther("60x60+100+100");
     watch();
     other->signal(SIGKILL);
@@ -202,6 +207,76 @@ TEST_F(X11ApplicationsTest, FrozenDisplayDoesNotHoldUpTheEnd) {
     server_.thaw();
 }
 
+TEST_F(X11ApplicationsTest, FrozenDisplayAnswersAgainOnceItGoesOn) {
+    client_.createWindow({0, 0, 50, 50}, 0, true);
+    EXPECT_TRUE(eventually([&] { return ownState() != kApplicationStateUnknown; }));
+    server_.freeze();
+    EXPECT_EQ(ownState(), kApplicationStateUnknown);
+    EXPECT_EQ(ownState(), kApplicationStateUnknown);
+    server_.thaw();
+    EXPECT_TRUE(eventually([&] { return ownState() != kApplicationStateUnknown; }));
+}
+
+TEST_F(X11ApplicationsTest, DisplayThatIsFrozenFromTheStartHoldsUpNobody) {
+    server_.freeze();
+    EXPECT_EQ(ownState(), kApplicationStateUnknown);
+    watch();
+    EXPECT_EQ(applications_.frontmostApplicationBundleIdentifier(), std::nullopt);
+    {
+        X11DisplayLayout service(server_.display());
+        EXPECT_EQ(service.createMonitor(0)->currentLayout().elements.size(), 1U);
+        X11RenderServer renderServer(server_.display());
+        EXPECT_EQ(renderServer.processIdentifierOfContext(1), std::nullopt);
+        X11Applications another(server_.display(), device_.bundles);
+        another.setUpdateHandler([](const ApplicationInformation&) {});
+    }
+    server_.thaw();
+    client_.createWindow({0, 0, 50, 50}, 0, true);
+    EXPECT_TRUE(wasTold("own", kApplicationStateForegroundObscured, false) ||
+                wasTold("own", kApplicationStateForeground, true));
+}
+
+TEST_F(X11ApplicationsTest, ProgramThatGotTheWindowNumberOfAnotherIsItself) {
+    auto first = startOther("60x60+100+100");
+    const auto numbers = topLevelWindows();
+    const int ended = first->processIdentifier();
+    first->signal(SIGKILL);
+    first->waitForExit();
+    // Nobody asks while there is no window.
+    const test::ChildProcess second({"xev", "-display", server_.display(), "-geometry", "60x60+100+100"});
+    ASSERT_TRUE(eventually([&] { return topLevelWindows() == numbers; }));
+    EXPECT_TRUE(applications_.informationOfProcess(second.processIdentifier()));
+    EXPECT_FALSE(applications_.informationOfProcess(ended));
+}
+
+TEST_F(X11ApplicationsTest, ApplicationOnAnotherDesktopIsInTheBackground) {
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
+    client_.createWindow({0, 0, 50, 50}, 0, true);
+    ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
+    watch();
+    test::ChildProcess change({"xdotool", "set_desktop", "1"}, {{"DISPLAY", server_.display()}});
+    EXPECT_TRUE(wasTold("own", kApplicationStateBackground, false));
+    EXPECT_EQ(applications_.frontmostApplicationBundleIdentifier(), std::nullopt);
+    test::ChildProcess back({"xdotool", "set_desktop", "0"}, {{"DISPLAY", server_.display()}});
+    EXPECT_TRUE(eventually([&] { return ownState() >= kApplicationStateForeground; }));
+}
+
+TEST_F(X11ApplicationsTest, FocusDecidesWhenTheWindowManagerDies) {
+    auto manager = std::make_unique<test::WindowManager>(server_.display());
+    ASSERT_TRUE(manager->isReady());
+    const auto window = client_.createWindow({0, 0, 50, 50}, 0, true);
+    ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
+    manager.reset();
+    xcb_set_input_focus(client_.raw(), XCB_INPUT_FOCUS_PARENT, client_.root(), XCB_CURRENT_TIME);
+    client_.sync();
+    EXPECT_TRUE(eventually([&] { return ownState() == kApplicationStateForegroundObscured; }));
+    client_.map(window);
+    xcb_set_input_focus(client_.raw(), XCB_INPUT_FOCUS_PARENT, window, XCB_CURRENT_TIME);
+    client_.sync();
+    EXPECT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
+}
+
 TEST_F(X11ApplicationsTest, DisplayThatIsNotThereHasNoApplications) {
     X11Applications nowhere(":4711", device_.bundles);
     nowhere.setUpdateHandler([](const ApplicationInformation&) {});
@@ -236,6 +311,16 @@ TEST_F(X11ApplicationsTest, LayoutTellsHowManyShareTheScreen) {
     other->signal(SIGKILL);
     EXPECT_TRUE(eventually([&] { return monitor->currentLayout().elements.size() == 1; }));
     EXPECT_EQ(observer->elements, 2U);
+}
+
+TEST_F(X11ApplicationsTest, LostDisplayIsAnEmptyDesktop) {
+    X11DisplayLayout service(server_.display());
+    const auto monitor = service.createMonitor(0);
+    client_.createWindow({0, 0, 200, 300}, 0, true);
+    ASSERT_TRUE(eventually([&] { return monitor->currentLayout().elements[0].level == 1; }));
+    server_.kill();
+    EXPECT_TRUE(eventually([&] { return monitor->currentLayout().elements[0].level == 0; }));
+    EXPECT_EQ(monitor->currentLayout().elements.size(), 1U);
 }
 
 TEST_F(X11ApplicationsTest, InvalidatedLayoutMonitorTellsNothing) {

@@ -1,6 +1,6 @@
 #include "platform/linux/x11/X11RenderServer.h"
-#include "support/ChildProcess.h"
 #include "support/Eventually.h"
+#include "support/x11/WindowManager.h"
 #include "support/x11/XClient.h"
 #include "support/x11/XvfbServer.h"
 
@@ -24,7 +24,7 @@ class X11RenderServerTest : public testing::Test {
         return parent;
     }
 
-    test::XvfbServer server_{200, 160};
+    test::XvfbServer server_{200, 160, test::XvfbServer::ownDisplay()};
     test::XClient client_{server_.display()};
     X11RenderServer renderServer_{server_.display()};
 };
@@ -46,7 +46,8 @@ TEST_F(X11RenderServerTest, RootWindowBelongsToNoClient) {
 }
 
 TEST_F(X11RenderServerTest, WindowManagersFrameBelongsToTheWindowWithin) {
-    test::ChildProcess manager({"openbox"}, {{"DISPLAY", server_.display()}});
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
     const auto window = client_.createWindow({10, 10, 50, 50}, 0, true);
     ASSERT_TRUE(eventually([&] { return parentOf(window) != client_.root(); }));
     EXPECT_EQ(renderServer_.processIdentifierOfContext(window), ::getpid());

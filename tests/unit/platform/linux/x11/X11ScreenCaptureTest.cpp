@@ -42,7 +42,7 @@ class X11ScreenCaptureTest : public testing::Test {
         return count;
     }
 
-    test::XvfbServer server_{200, 160};
+    test::XvfbServer server_{200, 160, test::XvfbServer::ownDisplay()};
     test::XClient client_{server_.display()};
     X11Screen screen_{server_.display()};
     std::shared_ptr<test::FrameRecorder> recorder_ = std::make_shared<test::FrameRecorder>();
