@@ -132,7 +132,9 @@ class RecordedScreen : public testing::Test {
     SimulatedDevice device_;
     TemporaryDirectory folder_;
     std::shared_ptr<const DeviceRoot> root_ = std::make_shared<const DeviceRoot>(folder_.path(), "");
-    XvfbServer server_{kWidth, kHeight};
+    XvfbServer server_{kHeight, kHeight};  // room for the screen to turn
+    XClient client_{server_.display()};
+    const bool isUpright_ = client_.resizeScreen(kWidth, kHeight);
     std::shared_ptr<x11::X11Screen> screen_ = std::make_shared<x11::X11Screen>(server_.display());
     CounterProgram counter_{server_.display(), kWidth, kHeight};
     HeldUpMoments heldUp_;
@@ -140,6 +142,14 @@ class RecordedScreen : public testing::Test {
     std::vector<Stretch> stretches_;
     Time beginning_{0};
 };
+
+std::vector<std::uint32_t> numbersOf(const std::vector<CounterFrame>& frames) {
+    std::vector<std::uint32_t> numbers;
+    for (const CounterFrame& frame : frames) {
+        if (frame.number) numbers.push_back(*frame.number);
+    }
+    return numbers;
+}
 
 TEST_F(RecordedScreen, EveryValueOfACounterIsInTheMovieOnceAtItsTimeAndPausesAreCutOut) {
     session_->setSystemRecording(true);
@@ -169,6 +179,25 @@ TEST_F(RecordedScreen, CoveredWindowIsRecordedWithoutAPixelOfItsCover) {
     const std::string movie = finish();
     checkMovie(readCounterMovie(movie));
     EXPECT_FALSE(showsGreen(movie));
+}
+
+TEST_F(RecordedScreen, ScreenThatTurnsStaysWholeInTheMovie) {
+    ASSERT_TRUE(isUpright_);
+    session_->setSystemRecording(true);
+    start();
+    record(500ms);
+    ASSERT_TRUE(client_.resizeScreen(kHeight, kWidth));
+    client_.place(counter_.window(), {0, 0, kHeight, kWidth});
+    record(1000ms);
+    const std::string movie = finish();
+    // The screen that lies across fills the width of the upright movie and leaves the rest black.
+    const auto upright = numbersOf(readCounterMovie(movie));
+    const auto lying = numbersOf(readCounterMovie(movie, "180:102:0:109"));
+    ASSERT_FALSE(upright.empty());
+    ASSERT_FALSE(lying.empty());
+    EXPECT_LT(upright.back(), lying.back());
+    EXPECT_GE(lying.size(), 20U);
+    EXPECT_TRUE(std::ranges::is_sorted(lying));
 }
 
 TEST_F(RecordedScreen, DisplayThatStandsStillHoldsUpNeitherPauseNorFinish) {
