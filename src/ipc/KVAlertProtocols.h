@@ -28,8 +28,16 @@ struct ProtocolTable<KVAlertServiceProtocol> {
     using P = KVAlertServiceProtocol;
     static constexpr std::string_view kName = "com.quillon.KelvoKit.KVAlertServiceProtocol";
     static constexpr std::tuple kMessages{
-        Message<&P::registerAlertShell>{"registerAlertShell", {}, {"error"}},
-        Message<&P::alertDidEnd>{"alertDidEnd", {"identifier", "response"}},
+        Message<&P::registerAlertShell>{
+            {"registerAlertShell",
+             "From now on this connection's process shows the alerts. Needs the right "
+             "com.quillon.private.kelvo-kit."},
+            {},
+            {Named{"error", "none; or EPERM without the right, EBUSY while another shell shows them"}}},
+        Message<&P::alertDidEnd>{
+            {"alertDidEnd", "An alert was answered."},
+            {Named{"identifier", "the alert's number"},
+             Named{"response", "0 default, 1 alternate, 2 other; any other: cancelled"}}},
     };
 };
 
@@ -50,10 +58,17 @@ struct ProtocolTable<KVAlertShellProtocol> {
     using P = KVAlertShellProtocol;
     static constexpr std::string_view kName = "com.quillon.KelvoKit.KVAlertShellProtocol";
     static constexpr std::tuple kMessages{
-        Message<&P::showAlert>{
-            "showAlert",
-            {"identifier", "header", "message", "defaultButton", "alternateButton", "otherButton"}},
-        Message<&P::cancelAlert>{"cancelAlert", {"identifier"}},
+        Message<&P::showAlert>{{"showAlert", "Show an alert. Buttons without a title are not shown."},
+                               {
+                                   Named{"identifier", "the alert's number, for the answer"},
+                                   Named{"header", "the title"},
+                                   Named{"message", "the text below it"},
+                                   Named{"defaultButton", "title of the button that answers 0"},
+                                   Named{"alternateButton", "title of the button that answers 1"},
+                                   Named{"otherButton", "title of the button that answers 2"},
+                               }},
+        Message<&P::cancelAlert>{{"cancelAlert", "The alert is no longer wanted."},
+                                 {Named{"identifier", "the alert's number"}}},
     };
 };
 

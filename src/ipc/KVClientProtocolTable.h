@@ -11,19 +11,47 @@ template <>
 struct ProtocolTable<KVClientProtocol> {
     using P = KVClientProtocol;
     static constexpr std::string_view kName = "com.quillon.KelvoKit.KVClientProtocol";
+    static constexpr Named kTimingData{
+        "timingData",
+        "72 bytes: duration, presentation and decode time, each a value (64-bit "
+        "integer), a time scale (32-bit integer), flags and an epoch"};
     static constexpr std::tuple kMessages{
-        Message<&P::updateScreenRecordingState>{"updateScreenRecordingState"},
-        Message<&P::updateBroadcastServiceInfo>{"updateBroadcastServiceInfo", {"serviceInfo"}},
-        Message<&P::updateBroadcastURL>{"updateBroadcastURL", {"broadcastURL"}},
-        Message<&P::recordingDidStopWithError>{"recordingDidStopWithError", {"error", "movieURL"}},
-        Message<&P::recordingLockInterrupted>{"recordingLockInterrupted", {"error"}},
-        Message<&P::recordingShouldResume>{"recordingShouldResume"},
-        Message<&P::recordingDidPause>{"recordingDidPause"},
-        Message<&P::recordingTimerDidUpdate>{"recordingTimerDidUpdate", {"timerText"}},
-        Message<&P::captureHandlerWithSample>{"captureHandlerWithSample", {"surface", "timingData"}},
+        Message<&P::updateScreenRecordingState>{
+            {"updateScreenRecordingState",
+             "The daemon's recording or broadcast state has changed: ask for it."}},
+        Message<&P::updateBroadcastServiceInfo>{
+            {"updateBroadcastServiceInfo", "The broadcast extension has published information."},
+            {Named{"serviceInfo", "the information, as the extension gave it"}}},
+        Message<&P::updateBroadcastURL>{
+            {"updateBroadcastURL", "The broadcast extension has published an address."},
+            {Named{"broadcastURL", "where the broadcast can be watched"}}},
+        Message<&P::recordingDidStopWithError>{
+            {"recordingDidStopWithError", "A recording or a broadcast has stopped."},
+            {Named{"error", "none, or why it stopped"}, Named{"movieURL", "none, or where the movie is"}}},
+        Message<&P::recordingLockInterrupted>{
+            {"recordingLockInterrupted", "The recording was interrupted because the device was locked."},
+            {Named{"error", "what to tell the user"}}},
+        Message<&P::recordingShouldResume>{
+            {"recordingShouldResume", "The client may go on with its paused recording."}},
+        Message<&P::recordingDidPause>{{"recordingDidPause", "The recording was paused."}},
+        Message<&P::recordingTimerDidUpdate>{{"recordingTimerDidUpdate", "A tick of the recording's timer."},
+                                             {Named{"timerText", "the text to show"}}},
+        Message<&P::captureHandlerWithSample>{
+            {"captureHandlerWithSample",
+             "One captured frame. It is lent: an answer, or the connection's end, gives it back."},
+            {Named{"surface", "none, or a memory file with its width, height, bytes a row and pixel format"},
+             kTimingData}},
         Message<&P::captureHandlerWithAudioSample>{
-            "captureHandlerWithAudioSample",
-            {"audioData", "absdData", "itemCount", "bufferType", "timingData"}},
+            {"captureHandlerWithAudioSample", "Captured sound."},
+            {
+                Named{"audioData", "the sound"},
+                Named{"absdData",
+                      "40 bytes of format: sample rate (64-bit float), then as 32-bit integers format, "
+                      "flags, bytes a packet, frames a packet, bytes a frame, channels, bits a channel, 0"},
+                Named{"itemCount", "how many sample frames the sound has"},
+                Named{"bufferType", "2 for the application's sound, 3 for the microphone's"},
+                kTimingData,
+            }},
     };
 };
 

@@ -20,13 +20,24 @@
 ///     struct ProtocolTable<Greeter> {
 ///         static constexpr std::string_view kName = "com.example.Greeter";
 ///         static constexpr std::tuple kMessages{
-///             Message<&Greeter::greet>{"greet", {"name"}, {"greeting"}},
+///             Message<&Greeter::greet>{{"greet", "Asks for a greeting."},
+///                                      {Named{"name", "who is to be greeted"}},
+///                                      {Named{"greeting", "what to say to them"}}},
 ///         };
 ///     };
 ///
 /// A last parameter of type `std::function<void(...)>` is the message's handler: its parameters are the
 /// reply.
 namespace kelvo {
+
+/// A message or one of its values: its name on the wire, and what the introspection file says about it.
+struct Named {
+    std::string_view name;
+    std::string_view documentation;
+
+    constexpr Named(const char* itsName, const char* itsDocumentation = "")
+        : name(itsName), documentation(itsDocumentation) {}
+};
 
 template <typename Protocol>
 struct ProtocolTable;
@@ -81,11 +92,13 @@ struct MemberTraits<void (Protocol_::*)(Parameters...)> {
 };
 
 template <std::size_t Count, typename... Types>
-std::vector<IPCArgument> describe(TypeList<Types...>, const std::array<std::string_view, Count>& names) {
+std::vector<IPCArgument> describe(TypeList<Types...>, const std::array<Named, Count>& values) {
     static_assert(Count == sizeof...(Types));
     std::vector<IPCArgument> described;
-    [[maybe_unused]] auto name = names.begin();
-    (described.push_back({std::string(*name++), IPCCoding<Types>::signature(), kAllowedObjects<Types>}), ...);
+    [[maybe_unused]] auto value = values.begin();
+    (described.push_back({std::string(value->name), IPCCoding<Types>::signature(), kAllowedObjects<Types>,
+                          std::string((value++)->documentation)}),
+     ...);
     return described;
 }
 
@@ -125,32 +138,33 @@ IPCReply decodingReply(Handler handler, std::function<void(const KVError&)> erro
 
 }  // namespace detail
 
-/// One row of a table: the member function, its name on the wire, and its arguments' names.
+/// One row of a table: the member function, its name, and those of its arguments and of its reply's values.
 template <auto Member>
 struct Message {
     using Traits = detail::MemberTraits<decltype(Member)>;
     using Protocol = typename Traits::Protocol;
     static constexpr auto kMember = Member;
 
-    std::string_view name;
-    std::array<std::string_view, Traits::Arguments::kSize> argumentNames{};
-    std::array<std::string_view, Traits::Reply::kSize> replyNames{};
+    Named message;
+    std::array<Named, Traits::Arguments::kSize> arguments{};
+    std::array<Named, Traits::Reply::kSize> reply{};
 
     IPCMethod description() const {
-        IPCMethod method{
-            std::string(name), detail::describe(typename Traits::Arguments(), argumentNames), {}};
-        if constexpr (Traits::kHasHandler)
-            method.reply = detail::describe(typename Traits::Reply(), replyNames);
+        IPCMethod method{std::string(message.name),
+                         detail::describe(typename Traits::Arguments(), arguments),
+                         {},
+                         std::string(message.documentation)};
+        if constexpr (Traits::kHasHandler) method.reply = detail::describe(typename Traits::Reply(), reply);
         return method;
     }
 
     /// Calls the member function with these arguments. False when they do not fit.
-    static bool call(Protocol& target, const Array& values, [[maybe_unused]] IPCReply reply) {
+    static bool call(Protocol& target, const Array& values, [[maybe_unused]] IPCReply answer) {
         return detail::withDecoded(typename Traits::Arguments(), values, [&](const auto&... decoded) {
             if constexpr (Traits::kHasHandler) {
                 (target.*Member)(decoded...,
                                  detail::replyingHandler(std::type_identity<typename Traits::Handler>(),
-                                                         std::move(reply)));
+                                                         std::move(answer)));
             } else {
                 (target.*Member)(decoded...);
             }

@@ -24,6 +24,8 @@ struct IPCArgument {
     /// `VideoSurface` and `h` an `IPCEndpoint`.
     std::string signature;
     IPCObjects allowedObjects = IPCObjects::none;
+    /// What it says, in a sentence for whoever writes a client.
+    std::string documentation = {};
 };
 
 /// One message of a protocol.
@@ -32,6 +34,7 @@ struct IPCMethod {
     std::vector<IPCArgument> arguments;
     /// What the reply holds; without one the message is one-way.
     std::optional<std::vector<IPCArgument>> reply;
+    std::string documentation = {};
 
     bool isOneWay() const { return !reply; }
 };

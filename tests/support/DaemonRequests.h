@@ -4,6 +4,7 @@
 
 #include <functional>
 #include <memory>
+#include <ostream>
 #include <string>
 #include <vector>
 
@@ -17,6 +18,8 @@ struct DaemonRequest {
     Array expectedArguments;
     /// What `FakeDaemon` answers; nothing for a one-way request.
     std::optional<Array> expectedReply;
+
+    friend void PrintTo(const DaemonRequest& request, std::ostream* out) { *out << request.name; }
 };
 
 inline Value valueOf(const OptionalError& error) {

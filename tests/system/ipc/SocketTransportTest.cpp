@@ -395,6 +395,8 @@ struct Attack {
     std::string name;
     std::function<void(const RawPeer&)> send;
     std::string reason;
+
+    friend void PrintTo(const Attack& attack, std::ostream* out) { *out << attack.name; }
 };
 
 std::vector<Attack> attacks() {

@@ -171,5 +171,18 @@ TEST_F(RecordedScreen, CoveredWindowIsRecordedWithoutAPixelOfItsCover) {
     EXPECT_FALSE(showsGreen(movie));
 }
 
+TEST_F(RecordedScreen, DisplayThatStandsStillHoldsUpNeitherPauseNorFinish) {
+    session_->setSystemRecording(true);
+    start();
+    record(500ms);
+    server_.freeze();
+    std::this_thread::sleep_for(100ms);
+    session_->pauseSession();
+    session_->resumeSessionWithContextID(counter_.window());
+    const auto frames = readCounterMovie(finish());
+    server_.thaw();
+    EXPECT_GT(frames.size(), 5U);
+}
+
 }  // namespace
 }  // namespace kelvo::test

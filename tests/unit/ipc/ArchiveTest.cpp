@@ -147,6 +147,8 @@ TEST_F(SurfaceObjectCodingTest, SameSurfaceTwiceIsHeldOnce) {
 struct Sample {
     const char* hexText;
     Value value;
+
+    friend void PrintTo(const Sample& sample, std::ostream* out) { *out << sample.hexText; }
 };
 class CBORTest : public testing::TestWithParam<Sample> {};
 

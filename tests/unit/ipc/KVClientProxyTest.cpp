@@ -18,6 +18,8 @@ struct Callback {
     std::string failureText;    // empty: nothing is sent
     std::string fanOutText;     // empty: nothing is logged by the multiple proxy
     std::string fanOutFailure;  // empty: nothing is sent by the multiple proxy
+
+    friend void PrintTo(const Callback& callback, std::ostream* out) { *out << callback.name; }
 };
 
 std::vector<Callback> callbacks() {
@@ -309,6 +311,17 @@ TEST_F(KVClientProxyFactoryTest, OtherClientsGetAProxyOfTheirOwn) {
         ASSERT_NE(single, nullptr);
         EXPECT_EQ(single->connection(), connection);
     }
+}
+
+TEST_F(KVClientProxyTest, MovieIsGivenWhereTheClientFindsIt) {
+    const Client client = connect(10);
+    std::static_pointer_cast<SimulatedConnection>(accepted.front())->peerSuffix = "?peer";
+    KVClientProxy(accepted.front()).recordingDidStopWithError(std::nullopt, URL("file:///m"));
+    KVMultipleClientProxy all;
+    all.handleNewConnection(accepted.front());
+    device.settle();
+    ASSERT_EQ(client.callbacks->stops.copy().size(), 1U);
+    EXPECT_EQ(client.callbacks->stops.copy().front().movieURL, URL("file:///m?peer"));
 }
 
 }  // namespace

@@ -17,13 +17,43 @@ constexpr const char* kStandardInterfaces =
     "    <method name=\"Ping\"/>\n"
     "  </interface>\n";
 
+/// Text as it may stand in an attribute.
+std::string escaped(const std::string& text) {
+    std::string result;
+    for (const char character : text) {
+        switch (character) {
+            case '&':
+                result += "&amp;";
+                break;
+            case '<':
+                result += "&lt;";
+                break;
+            case '"':
+                result += "&quot;";
+                break;
+            default:
+                result += character;
+        }
+    }
+    return result;
+}
+
+/// What tools know as an element's documentation; nothing without one.
+std::string documentationXML(const std::string& documentation, const char* indentation) {
+    if (documentation.empty()) return {};
+    return std::string(indentation) + "<annotation name=\"org.gtk.GDBus.DocString\" value=\"" +
+           escaped(documentation) + "\"/>\n";
+}
+
 std::string argumentXML(const IPCArgument& argument, const char* direction) {
-    return "      <arg name=\"" + argument.name + "\" type=\"" + argument.signature + "\" direction=\"" +
-           direction + "\"/>\n";
+    const std::string head = "      <arg name=\"" + argument.name + "\" type=\"" + argument.signature +
+                             "\" direction=\"" + direction + "\"";
+    const std::string content = documentationXML(argument.documentation, "        ");
+    return content.empty() ? head + "/>\n" : head + ">\n" + content + "      </arg>\n";
 }
 
 std::string methodXML(const IPCMethod& method) {
-    std::string content;
+    std::string content = documentationXML(method.documentation, "      ");
     for (const IPCArgument& argument : method.arguments)
         content += argumentXML(argument, "in");
     if (method.isOneWay()) {
@@ -43,6 +73,12 @@ std::string interfaceXML(const IPCInterface& interface) {
     for (const IPCMethod& method : interface.methods)
         text += methodXML(method);
     return text + "  </interface>\n";
+}
+
+std::string interfaceFile(const IPCInterface& interface) {
+    return kDocumentType +
+           std::string("<!-- Made from the protocol's table; see docs/wire.md. -->\n<node name=\"") +
+           kObjectPath + "\">\n" + interfaceXML(interface) + "</node>\n";
 }
 
 std::string objectXML(const IPCInterface& interface) {

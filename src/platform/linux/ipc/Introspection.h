@@ -6,8 +6,14 @@
 
 namespace kelvo::dbus {
 
+/// The one object that either side of a connection has.
+inline constexpr const char* kObjectPath = "/com/quillon/kelvod";
+
 /// The D-Bus description of one interface, as it stands in an introspection file.
 std::string interfaceXML(const IPCInterface& interface);
+
+/// An introspection file of its own: of the object, where it serves `interface`.
+std::string interfaceFile(const IPCInterface& interface);
 
 /// The answer to `Introspect` on an object that serves `interface` and the standard ones.
 std::string objectXML(const IPCInterface& interface);

@@ -12,7 +12,8 @@
 namespace kelvo {
 namespace {
 
-constexpr const char* kObjectPath = "/com/quillon/kelvod";
+using dbus::kObjectPath;
+
 /// The objects above ours, and the one child of each.
 constexpr std::array<std::pair<std::string_view, const char*>, 3> kParents{
     {{"/", "com"}, {"/com", "quillon"}, {"/com/quillon", "kelvod"}}};

@@ -5,7 +5,6 @@
 #include <algorithm>
 #include <string>
 #include <utility>
-#include <xcb/res.h>
 
 namespace kelvo::x11 {
 namespace {
@@ -44,9 +43,7 @@ struct DesktopReader::Context {
 };
 
 std::optional<DesktopReader> DesktopReader::open(XConnection& connection) {
-    if (!connection.hasExtension(xcb_res_id)) return std::nullopt;
-    if (!connection.await<xcb_res_query_version_reply_t>(xcb_res_query_version(connection.raw(), 1, 2)))
-        return std::nullopt;
+    if (!canTellCreators(connection)) return std::nullopt;
     return DesktopReader(connection);
 }
 

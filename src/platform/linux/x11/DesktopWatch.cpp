@@ -69,6 +69,7 @@ void DesktopWatch::watch(const Handler& handler) {
     bool isReachable = true;
     while (!isStopping_) {
         if (!connect()) {
+            if (!wait(0)) return;
             if (std::exchange(isReachable, false))
                 KVLogError("cannot reach the display; what it shows is unknown until it is there");
             report({}, handler);
@@ -95,7 +96,7 @@ void DesktopWatch::watch(const Handler& handler) {
 }
 
 bool DesktopWatch::connect() {
-    if (connection_ && !connection_->isBroken()) {
+    if (reader_ && !connection_->isBroken()) {
         connection_->tryAgain();
         return true;
     }

@@ -1,12 +1,9 @@
 #include "platform/linux/x11/X11Applications.h"
 
-#include <chrono>
 #include <utility>
 
 namespace kelvo::x11 {
 namespace {
-
-constexpr std::chrono::seconds kReplyLimit{2};
 
 std::int32_t stateOf(const DesktopApplication& application) {
     if (application.isActive) return kApplicationStateForeground;
@@ -77,12 +74,12 @@ std::optional<ApplicationInformation> X11Applications::find(std::string_view bun
 
 DesktopView X11Applications::currentView() {
     const std::lock_guard lock(connectionMutex_);
-    if (!connection_ || connection_->isBroken()) {
+    if (!reader_ || connection_->isBroken()) {
         reader_.reset();
-        connection_ = XConnection::open(display_, -1, kReplyLimit);
+        connection_ = XConnection::open(display_);
         if (connection_) reader_ = DesktopReader::open(*connection_);
     }
-    if (!connection_ || !reader_) return {};
+    if (!reader_) return {};
     connection_->tryAgain();
     return reader_->read().value_or(DesktopView());
 }

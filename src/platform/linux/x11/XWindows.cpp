@@ -9,6 +9,13 @@ constexpr std::uint32_t kMostItems = 4096;
 
 }  // namespace
 
+bool canTellCreators(XConnection& connection) {
+    if (!connection.hasExtension(xcb_res_id)) return false;
+    const auto version =
+        connection.await<xcb_res_query_version_reply_t>(xcb_res_query_version(connection.raw(), 1, 2));
+    return version != nullptr;
+}
+
 std::optional<std::int32_t> creatorOf(XConnection& connection, xcb_window_t window) {
     const xcb_res_client_id_spec_t asked{window, XCB_RES_CLIENT_ID_MASK_LOCAL_CLIENT_PID};
     const auto reply = connection.await<xcb_res_query_client_ids_reply_t>(

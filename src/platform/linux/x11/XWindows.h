@@ -9,8 +9,12 @@
 
 namespace kelvo::x11 {
 
+/// Whether the server can tell who made a window, and answers.
+bool canTellCreators(XConnection& connection);
+
 /// The process that made a window, by what the X server itself knows of its clients; what windows say about
-/// themselves is not believed. Needs the server's XRes extension. One thread at a time, as the connection.
+/// themselves is not believed. Of a server of which `canTellCreators` holds. One thread at a time, as the
+/// connection.
 std::optional<std::int32_t> creatorOf(XConnection& connection, xcb_window_t window);
 
 /// The window by which a running window manager shows that it runs; a dead one leaves a name of a window

@@ -27,6 +27,10 @@ struct Body {
     const char* signature;
     Array values;
     const char* hexText;
+
+    friend void PrintTo(const Body& body, std::ostream* out) {
+        *out << body.signature << " as " << body.hexText;
+    }
 };
 class BodyTest : public testing::TestWithParam<Body> {};
 
@@ -66,23 +70,30 @@ INSTANTIATE_TEST_SUITE_P(
                          "fbffffffffffffff"
                          "0000000000000000"}));
 
-class ValueTest : public testing::TestWithParam<Value> {};
+struct Kind {
+    const char* name;
+    Value value;
+
+    friend void PrintTo(const Kind& kind, std::ostream* out) { *out << kind.name; }
+};
+class ValueTest : public testing::TestWithParam<Kind> {};
 
 TEST_P(ValueTest, SurvivesAVariant) {
     Message message;
     message.signature = "a{sv}";
-    const Array sent{Dictionary{{"key", GetParam()}}};
+    const Array sent{Dictionary{{"key", GetParam().value}}};
     ASSERT_FALSE(writeBody(sent, message));
     EXPECT_EQ(*readBody(message, false), sent);
 }
 
 INSTANTIATE_TEST_SUITE_P(Kinds, ValueTest,
-                         testing::Values(Value(), Value(false), Value(-7), Value(std::uint64_t{UINT64_MAX}),
-                                         Value(0.5), Value("text"), Value(Bytes(5)), Value(Date{-3}),
-                                         Value(URL("file:///a b")),
-                                         Value(KVError("d", -5800, {{"k", Array{1}}})),
-                                         Value(Array{1, Array{"x"}}),
-                                         Value(Dictionary{{"a", Dictionary{{"b", 1}}}})));
+                         testing::Values(Kind{"nothing", Value()}, Kind{"boolean", false},
+                                         Kind{"negative", -7}, Kind{"large", std::uint64_t{UINT64_MAX}},
+                                         Kind{"double", 0.5}, Kind{"text", "text"}, Kind{"bytes", Bytes(5)},
+                                         Kind{"date", Date{-3}}, Kind{"URL", URL("file:///a b")},
+                                         Kind{"error", KVError("d", -5800, {{"k", Array{1}}})},
+                                         Kind{"array", Array{1, Array{"x"}}},
+                                         Kind{"dictionary", Dictionary{{"a", Dictionary{{"b", 1}}}}}));
 
 TEST(BodyWriter, RefusesWhatDoesNotFit) {
     const std::vector<std::pair<const char*, Array>> wrong{{"b", {1}},
