@@ -177,11 +177,17 @@ void DesktopReader::take(const Asked& asked, const Context& context, std::vector
                        asked.window == context.active});
 }
 
+/// Asked anew each time: the server gives the numbers of a program that ended, its windows' too, to the next
+/// one.
 std::optional<std::int32_t> DesktopReader::processOf(xcb_window_t window) {
-    const auto known = processes_.find(window);
-    if (known != processes_.end()) return known->second;
     const auto process = creatorOf(*connection_, window);
-    if (process) processes_[window] = *process;
+    const auto known = processes_.find(window);
+    if (known != processes_.end() && known->second != process) std::erase(selected_, window);
+    if (process) {
+        processes_[window] = *process;
+    } else {
+        processes_.erase(window);
+    }
     return process;
 }
 
