@@ -5,6 +5,7 @@
 #include "ProcessorTime.h"
 #include "base/KVLog.h"
 #include "base/VideoSurfacePool.h"
+#include "ipc/KVClientProtocolTable.h"
 #include "ipc/KVClientProxy.h"
 #include "platform/linux/ipc/SocketTransport.h"
 #include "support/FakeDaemon.h"
