@@ -175,32 +175,12 @@ void DesktopReader::take(const Asked& asked, Context& context) {
     const bool isElsewhere = !desktops.empty() && desktops.front() != kAllDesktops &&
                              context.desktop != kAllDesktops && desktops.front() != context.desktop;
     const bool isHidden = holds(state, atom("_NET_WM_STATE_HIDDEN"));
-<<<<<<< HEAD
-    if (!process || isElsewhere || isHidden || attributes->map_state != XCB_MAP_STATE_VIEWABLE) return;
-    visible.push_back({*process, origin->dst_x, origin->dst_y, geometry->width, geometry->height,
-                       asked.window == context.active});
-}
-
-/// Asked anew each time: the server gives the numbers of a program that ended, its windows' too, to the next
-/// one.
-std::optional<std::int32_t> DesktopReader::processOf(xcb_window_t window) {
-    const auto process = creatorOf(*connection_, window);
-    const auto known = processes_.find(window);
-    if (known != processes_.end() && known->second != process) std::erase(selected_, window);
-    if (process) {
-        processes_[window] = *process;
-    } else {
-        processes_.erase(window);
-    }
-    return process;
-=======
     if (isElsewhere || isHidden || attributes->map_state != XCB_MAP_STATE_VIEWABLE) return;
     const bool isActive = asked.window == context.active;
     application.isVisible = true;
     application.isActive |= isActive;
     context.visible.push_back(
         {*process, origin->dst_x, origin->dst_y, geometry->width, geometry->height, isActive});
->>>>>>> main
 }
 
 xcb_atom_t DesktopReader::atom(std::string_view name) {

@@ -46,12 +46,7 @@ class DesktopReader {
     XConnection* connection_;
     bool hasManager_ = false;
     std::vector<xcb_window_t> windows_;
-<<<<<<< HEAD
-    std::map<xcb_window_t, std::int32_t> processes_;  ///< who made a window
-    std::vector<xcb_window_t> selected_;              ///< whose events we get
-=======
     std::vector<xcb_window_t> selected_;  ///< whose events we get
->>>>>>> main
     std::map<std::string, xcb_atom_t, std::less<>> atoms_;
 };
 
