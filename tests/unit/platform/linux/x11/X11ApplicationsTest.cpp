@@ -140,26 +140,6 @@ TEST_F(X11ApplicationsTest, ApplicationThatEndsIsTerminated) {
     EXPECT_TRUE(wasTold("other", kApplicationStateTerminated, false));
 }
 
-TEST_F(X11ApplicationsTest, WindowWithTheNumberOfOneThatIsGoneIsItsOwnPrograms) {
-    const test::WindowManager manager(server_.display());
-    ASSERT_TRUE(manager.isReady());
-    const auto waitFor = [&](const std::string& list) {
-        const std::string look =
-            "until xprop -root _NET_CLIENT_LIST | grep -q '" + list + "'; do sleep 0.02; done";
-        return test::ChildProcess({"sh", "-c", look}, {{"DISPLAY", server_.display()}}).waitForExit() == 0;
-    };
-    startOther("60x60+100+100").reset();
-    // Nobody looks in between: the server gives the numbers of the one to the next.
-    ASSERT_TRUE(waitFor("# $"));
-    const test::ChildProcess next({"xev", "-display", server_.display(), "-geometry", "60x60+100+100"});
-    device_.bundles->addProcess(next.processIdentifier(), "/Applications/Next.app/next");
-    addBundle("/Applications/Next.app", "next");
-    ASSERT_TRUE(waitFor("# 0x"));
-    EXPECT_TRUE(
-        eventually([&] { return applications_.stateOfApplication("next") == kApplicationStateForeground; }));
-    EXPECT_EQ(applications_.stateOfApplication("other"), kApplicationStateUnknown);
-}
-
 TEST_F(X11ApplicationsTest, ProgramWithoutABundleGoesByItsPath) {
     const auto other = startOther("60x60+100+100");
     device_.bundles->addProcess(::getpid(), "/usr/bin/tool");
