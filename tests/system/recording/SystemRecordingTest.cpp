@@ -125,6 +125,24 @@ TEST_F(SystemRecordingTest, BroadcastWithoutASetUpIsRefused) {
     EXPECT_EQ(client->flag("isRecording"), false);
 }
 
+TEST_F(SystemRecordingTest, ClientsThatComeAndGoLeaveNothingBehind) {
+    const auto entriesOf = [this](const std::string& folder) {
+        return std::distance(std::filesystem::directory_iterator(
+                                 "/proc/" + std::to_string(daemon_->processIdentifier()) + "/" + folder),
+                             std::filesystem::directory_iterator());
+    };
+    shell()->kill();
+    EXPECT_TRUE(logs("connection INVALID"));
+    const auto threads = entriesOf("task");
+    const auto descriptors = entriesOf("fd");
+    for (int i = 0; i < 10; ++i)
+        shell()->kill();
+    EXPECT_TRUE(eventually(
+        [&] { return entriesOf("task") <= threads + 1 && entriesOf("fd") <= descriptors + 1; }, 20s))
+        << threads << " threads, now " << entriesOf("task") << "; " << descriptors << " descriptors, now "
+        << entriesOf("fd");
+}
+
 TEST_F(SystemRecordingTest, OnlyMoviesOfTheStoreAreSavedAndDeleted) {
     const auto client = shell();
     const std::string mine = root_.write("mine.mp4", "mine");
