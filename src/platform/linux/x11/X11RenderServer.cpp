@@ -22,10 +22,8 @@ std::optional<std::int32_t> X11RenderServer::processIdentifierOfContext(std::uin
 }
 
 bool X11RenderServer::connect() {
-    if (connection_ && !connection_->isBroken()) {
-        connection_->tryAgain();
-        return true;
-    }
+    // A server that stands still would let what it is asked pile up.
+    if (connection_ && !connection_->isBroken() && !connection_->hasGivenUp()) return true;
     connection_ = XConnection::open(display_);
     // One that did not answer so far is of no use later: its extension may not be asked for anything.
     if (connection_ && !canTellCreators(*connection_)) connection_.reset();

@@ -1,7 +1,7 @@
 #include "platform/linux/x11/XHandshake.h"
 
 #include "base/UniqueFd.h"
-#include "platform/linux/x11/MirroringState.h"
+#include "platform/linux/x11/WakeEvent.h"
 #include "platform/linux/x11/XConnection.h"
 
 #include <X11/Xauth.h>
