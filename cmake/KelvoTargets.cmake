@@ -48,9 +48,9 @@ function(kelvo_test name)
         ENVIRONMENT TSAN_OPTIONS=suppressions=${CMAKE_SOURCE_DIR}/tests/tsan-suppressions.txt)
 endfunction()
 
-# kelvo_loads_modules(TARGET): the program TARGET may load our modules, which use its base and platform libraries: all of them are
+# kelvo_loads_modules(TARGET): the program TARGET may load our modules, which use its base library: all of it is
 # linked in and exported.
 function(kelvo_loads_modules target)
     set_target_properties(${target} PROPERTIES ENABLE_EXPORTS ON
-        LINK_LIBRARY_OVERRIDE "WHOLE_ARCHIVE,kelvo_base,kelvo_platform")
+        LINK_LIBRARY_OVERRIDE "WHOLE_ARCHIVE,kelvo_base")
 endfunction()
