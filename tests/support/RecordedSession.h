@@ -42,7 +42,8 @@ class RecordedSession : public testing::Test {
     /// With the sound of `audio`; without, with the simulated device's. The display can be resized up to
     /// `largestSide` either way.
     RecordedSession(int width, int height, std::shared_ptr<AudioService> audio = nullptr, int largestSide = 0)
-        : server_(std::max(width, largestSide), std::max(height, largestSide)), screen_(std::make_shared<x11::X11Screen>(server_.display())) {
+        : server_(std::max(width, largestSide), std::max(height, largestSide)),
+          screen_(std::make_shared<x11::X11Screen>(server_.display())) {
         Platform platform = device_.platform();
         platform.clock = std::make_shared<SystemClock>();
         platform.fileSystem = std::make_shared<LinuxFileSystem>(root_);
