@@ -1,9 +1,9 @@
 #pragma once
 
 #include "base/Guarded.h"
+#include "base/MovieTimeline.h"
 #include "platform/BufferQueue.h"
 #include "platform/MediaFileWriter.h"
-#include "platform/MovieTimeline.h"
 #include "platform/simulated/SimulatedFaults.h"
 #include "platform/simulated/SimulatedFileSystem.h"
 

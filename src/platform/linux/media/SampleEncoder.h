@@ -1,9 +1,9 @@
 #pragma once
 
+#include "base/MovieTimeline.h"
 #include "base/Result.h"
 #include "base/SampleBuffer.h"
 #include "base/Value.h"
-#include "platform/MovieTimeline.h"
 #include "platform/WriterInput.h"
 #include "platform/linux/media/MovieTrack.h"
 

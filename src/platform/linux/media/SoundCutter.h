@@ -1,7 +1,7 @@
 #pragma once
 
 #include "base/KVError.h"
-#include "platform/MovieTimeline.h"
+#include "base/MovieTimeline.h"
 #include "platform/linux/media/AudioAligner.h"
 #include "platform/linux/media/PcmReader.h"
 

@@ -1,4 +1,4 @@
-#include "platform/MovieTimeline.h"
+#include "base/MovieTimeline.h"
 
 #include <iterator>
 
