@@ -9,6 +9,7 @@
 #include <deque>
 #include <mutex>
 #include <thread>
+#include <utility>
 #include <vector>
 
 namespace kelvo {
@@ -66,11 +67,19 @@ class SerialQueue::State {
     void sync(const Task& task) {
         if (isCurrent()) abortWithLabel();
         acquireToken();
+        runInTurn(task);
+    }
+
+    bool tryTakeTurn() {
+        const std::lock_guard lock(mutex_);
+        return !std::exchange(busy_, true);
+    }
+    void runInTurn(const Task& task) {
         {
             const Running running(this);
             task();
         }
-        std::lock_guard lock(mutex_);
+        const std::lock_guard lock(mutex_);
         passToken();
     }
 
@@ -176,6 +185,13 @@ void SerialQueue::async(Task task) {
 void SerialQueue::sync(const Task& task) {
     const std::shared_ptr<State> state = state_;  // the task may let the last reference to this queue go
     state->sync(task);
+}
+bool SerialQueue::tryTakeTurn() {
+    return state_->tryTakeTurn();
+}
+void SerialQueue::runInTurn(const Task& task) {
+    const std::shared_ptr<State> state = state_;
+    state->runInTurn(task);
 }
 
 }  // namespace kelvo

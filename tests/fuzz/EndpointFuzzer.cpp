@@ -1,3 +1,4 @@
+#include "../support/DescriptorPassing.h"
 #include "base/KVError.h"
 #include "platform/linux/ipc/DBusMessage.h"
 #include "platform/linux/ipc/SocketEndpoint.h"
@@ -11,8 +12,6 @@
 #include <sys/mman.h>
 #include <sys/socket.h>
 #include <unistd.h>
-
-#include "../support/DescriptorPassing.h"
 
 namespace {
 
@@ -45,7 +44,8 @@ void readMessage(std::span<const std::byte> bytes, unsigned kinds, unsigned coun
     auto message = kelvo::dbus::parse(bytes, claimed);
     if (!message) return;
     for (unsigned i = 0; i < count; ++i)
-        message->descriptors.emplace_back(::fcntl(descriptorOfKind(kinds >> (2 * i)).get(), F_DUPFD_CLOEXEC, 0));
+        message->descriptors.emplace_back(
+            ::fcntl(descriptorOfKind(kinds >> (2 * i)).get(), F_DUPFD_CLOEXEC, 0));
     static_cast<void>(kelvo::dbus::readBody(*message, true));
 }
 
@@ -64,15 +64,16 @@ void receivePacket(std::span<const std::byte> bytes, unsigned kinds, unsigned co
     const UniqueFd connection = kelvo::SocketEndpoint::receiveConnection(listener.get(), isAtEnd);
     int type = 0;
     socklen_t size = sizeof(type);
-    const bool isStream = connection && ::getsockopt(connection.get(), SOL_SOCKET, SO_TYPE, &type, &size) == 0 &&
+    const bool isStream = connection &&
+                          ::getsockopt(connection.get(), SOL_SOCKET, SO_TYPE, &type, &size) == 0 &&
                           type == SOCK_STREAM;
     if (connection && (!isStream || count != 1 || isAtEnd)) std::abort();
 }
 
 }  // namespace
 
-/// The first two bytes say which descriptors there are, the rest are the message. Whatever comes, no descriptor
-/// is left behind.
+/// The first two bytes say which descriptors there are, the rest are the message. Whatever comes, no
+/// descriptor is left behind.
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     if (size < 2) return 0;
     const unsigned kinds = data[0];
