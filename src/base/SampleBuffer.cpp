@@ -8,6 +8,7 @@ SampleBufferRef SampleBuffer::video(VideoSurfaceRef surface, const TimingRecord&
     SampleBufferRef sample(new SampleBuffer);
     sample->surface_ = std::move(surface);
     sample->timing_ = {timing};
+    sample->captureTime_ = timing.presentationTime;
     return sample;
 }
 
@@ -18,6 +19,7 @@ SampleBufferRef SampleBuffer::audio(const AudioFormatRecord& format, Bytes bytes
     sample->audioBytes_ = std::make_shared<Bytes>(std::move(bytes));
     sample->sampleCount_ = sampleCount;
     sample->timing_ = {timing};
+    sample->captureTime_ = timing.presentationTime;
     return sample;
 }
 

@@ -39,6 +39,10 @@ class SampleBuffer {
     MediaTime presentationTime() const { return timing_.front().presentationTime; }
     MediaTime decodeTime() const { return timing_.front().decodeTime; }
 
+    /// When it was captured, on the host's clock: the presentation time that it was made with. Copies with
+    /// other times keep it.
+    MediaTime captureTime() const { return captureTime_; }
+
     /// One record for the whole buffer, or one for each of its samples; never empty.
     std::span<const TimingRecord> timing() const { return timing_; }
 
@@ -56,6 +60,7 @@ class SampleBuffer {
     std::shared_ptr<Bytes> audioBytes_;
     std::int64_t sampleCount_ = 1;
     std::vector<TimingRecord> timing_;
+    MediaTime captureTime_;
 };
 
 }  // namespace kelvo

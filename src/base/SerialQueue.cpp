@@ -83,6 +83,12 @@ class SerialQueue::State {
         passToken();
     }
 
+    void retire() {
+        std::lock_guard lock(mutex_);
+        retired_ = true;
+        workerWakes_.notify_one();
+    }
+
     void finish() {
         std::thread worker;
         {
@@ -121,7 +127,7 @@ class SerialQueue::State {
     void passToken() {
         busy_ = !items_.empty();
         if (!busy_) {
-            if (finishing_) workerWakes_.notify_one();  // a `sync` task let the queue go: nothing follows it
+            if (isLeaving()) workerWakes_.notify_one();  // a `sync` task let the queue go: nothing follows it
             return;
         }
         if (Turn* turn = items_.front().turn; turn != nullptr) {
@@ -139,13 +145,19 @@ class SerialQueue::State {
         const Running running(this);
         std::unique_lock lock(mutex_);
         while (true) {
-            workerWakes_.wait(lock, [this] { return workerHasToken_ || (finishing_ && !busy_); });
-            if (!workerHasToken_) return;
+            workerWakes_.wait(lock, [this] { return workerHasToken_ || (isLeaving() && !busy_); });
+            if (!workerHasToken_) {
+                if (worker_.joinable()) worker_.detach();  // nobody waits for it; the state lives on with it
+                return;
+            }
             workerHasToken_ = false;
             runOwnItems(lock);
             passToken();
         }
     }
+
+    /// Whether the queue's thread is to end when there is nothing to do.
+    bool isLeaving() const { return finishing_ || retired_; }
 
     void runOwnItems(std::unique_lock<std::mutex>& lock) {
         while (!items_.empty() && items_.front().turn == nullptr) {
@@ -166,6 +178,7 @@ class SerialQueue::State {
     bool busy_ = false;
     bool workerHasToken_ = false;
     bool finishing_ = false;
+    bool retired_ = false;
 };
 
 SerialQueue::SerialQueue(std::string label) : state_(std::make_shared<State>(std::move(label))) {}
@@ -178,6 +191,9 @@ const std::string& SerialQueue::label() const {
 }
 bool SerialQueue::isCurrent() const {
     return state_->isCurrent();
+}
+void SerialQueue::retire() {
+    state_->retire();
 }
 void SerialQueue::async(Task task) {
     state_->async(std::move(task), state_);

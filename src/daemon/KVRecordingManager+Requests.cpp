@@ -35,11 +35,19 @@ void KVRecordingManager::stopRecordingWithHandler(MovieHandler handler) {
 void KVRecordingManager::stopRecordingWithStartClipDuration(double startClipDuration, double endClipDuration,
                                                             MovieHandler handler) {
     KVLog("KVRecordingManager: stopRecordingWithStartTimeOffset:endTimeOffset:handler:");
+    // Without a handler the movie is thrown away: such a stop has to stay without one.
     sessionManager_->stopRecordingSession(getCallingConnectionRecordingSession(), startClipDuration,
-                                          endClipDuration, std::move(handler));
+                                          endClipDuration,
+                                          handler ? endingWork(std::move(handler)) : nullptr);
 }
 
 void KVRecordingManager::saveVideoToCameraRoll(const URL& movieURL, ErrorHandler handler) {
+    // A saved movie is deleted: what is not the daemon's own must not come to that.
+    if (!KVTemporaryFileStore::isInStore(movieURL)) {
+        KVLogError("KVRecordingManager: saveVideoToCameraRoll: not a movie of the store");
+        if (handler) handler(errors_->kvUserErrorForCode(kRecordingErrorFailedToSave));
+        return;
+    }
     saveVideoToCameraRoll(std::optional(movieURL), std::move(handler));
 }
 
@@ -50,12 +58,13 @@ void KVRecordingManager::pauseRecording() {
     session->pauseSession();
 }
 
-/// A broadcast goes on without its user being asked: there is no alert for that yet.
 void KVRecordingManager::resumeRecordingWithWindowLayerContextID(std::uint32_t windowLayerContextID) {
     const SessionRef session = getCallingConnectionRecordingSession();
     if (!session || session->isSystemRecording()) return;
+    const bool isDeclined = session->isBroadcasting() && session->isRecording() &&
+                            !showResumeBroadcastAlertWithSession(session, windowLayerContextID);
     const bool isPausedRecording = session->isRecording() && session->isPaused();
-    if (checkContextIDsMatch({windowLayerContextID})) {
+    if (checkContextIDsMatch({windowLayerContextID}) && !isDeclined) {
         KVLog("KVRecordingManager: resumeRecording");
         if (isPausedRecording) session->resumeSessionWithContextID(windowLayerContextID);
         return;
@@ -88,7 +97,10 @@ void KVRecordingManager::updateProcessIDForAudioCaptureWithPID(std::int32_t proc
 void KVRecordingManager::discardRecordingWithHandler(DoneHandler handler) {
     KVLog("KVRecordingManager: discardRecording");
     const SessionRef session = getCallingConnectionRecordingSession();
-    if (!session) return;
+    if (!session) {
+        if (handler) handler();  // there is nothing to discard
+        return;
+    }
     if (session->isRecording()) {
         KVLogError("can't discard recording while recording is in progress");
         return;

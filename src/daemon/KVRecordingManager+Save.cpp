@@ -8,13 +8,12 @@ namespace kelvo {
 
 void KVRecordingManager::saveVideoToCameraRoll(const std::optional<URL>& movieURL, ErrorHandler completion) {
     KVLog("KVRecordingManager: saveVideoToCameraRoll:");
-    mixer_->mixAudioForMovie(movieURL,
-                             [weakSelf = weak_from_this(), movieURL, completion = std::move(completion)](
-                                 const auto& mixedURL, const auto& error) {
-                                 if (error) KVLogError("Error Mixing video Audio tracks");
-                                 if (const auto self = weakSelf.lock())
-                                     self->saveFinishedMovie(movieURL, mixedURL, completion);
-                             });
+    mixer_->mixAudioForMovie(
+        movieURL, [weakSelf = weak_from_this(), movieURL, completion = endingWork(std::move(completion))](
+                      const auto& mixedURL, const auto& error) {
+            if (error) KVLogError("Error Mixing video Audio tracks");
+            if (const auto self = weakSelf.lock()) self->saveFinishedMovie(movieURL, mixedURL, completion);
+        });
 }
 
 /// Saves the mixed movie, or the unmixed one when there is no other, and leaves neither behind.
@@ -55,11 +54,6 @@ void KVRecordingManager::failedToSaveRecordingForRecordingSession(const SessionR
     KVLog("KVRecordingManager:saveVideoToCameraRoll: Video saved to camera roll failed");
 }
 
-/// Remembers the asset that the bulletin speaks of; bulletins themselves cannot be posted yet.
-void KVRecordingManager::displayScreenRecorderBulletinWithURL(const std::string& localIdentifier) {
-    photoAsset_.set(platform_.photoLibrary->assetWithLocalIdentifier(localIdentifier));
-}
-
 void KVRecordingManager::showOnAlertQueue(std::function<void(KVRecordingManager&)> show) {
     kelvoAlertQueue().async([weakSelf = weak_from_this(), show = std::move(show)] {
         if (const auto self = weakSelf.lock()) show(*self);
@@ -73,6 +67,16 @@ void KVRecordingManager::showAlertForRecordingSession(const SessionRef&, const O
 void KVRecordingManager::showAlertRecordingSessionFailedToSaveFile(const SessionRef&,
                                                                    const OptionalError& error) {
     showFailureAlert("RECORDING_FAILED_TO_SAVE_ALERT_MESSAGE_FORMAT", error);
+}
+
+void KVRecordingManager::showAlertForBroadcastSession(const SessionRef&, const OptionalError& error) {
+    KVLogError("KVRecordingManager: showAlertForBroadcastSession is not offered yet: %d",
+               error ? static_cast<int>(error->code()) : 0);
+}
+
+bool KVRecordingManager::showResumeBroadcastAlertWithSession(const SessionRef&, std::uint32_t) {
+    KVLogError("KVRecordingManager: showResumeBroadcastAlertWithSession is not offered yet");
+    return true;
 }
 
 /// Readers of logs know both alerts, and their failures, by the same texts.

@@ -58,6 +58,10 @@ void KVRecordingManager::startRecordingWindowLayerContextIDs(
 
 /// What is checked before anything else is touched.
 bool KVRecordingManager::isClientAllowedToStart(const StartRequest& request) {
+    if (isTerminating()) {
+        request.refuse(errors_->kvUserErrorForCode(kRecordingErrorInterrupted));
+        return false;
+    }
     if (platform_.inCarDisplay->isActive().valueOr(false)) {
         request.refuseAndUpdate(errors_->kvUserErrorForCode(kRecordingErrorAutobay));
         return false;
@@ -96,6 +100,8 @@ void KVRecordingManager::continueStart(const StartRequestRef& request) {
     if (!request->systemRecording && !doesUserConsent(*request)) return;
     KVLog("starting...");
     if (!isScreenFreeFor(*request)) return;
+    // The process may have been told to end while the user was asked.
+    if (isTerminating()) return request->refuse(errors_->kvUserErrorForCode(kRecordingErrorInterrupted));
     beginTransaction();
     if (!prepareBroadcast(*request)) return;
     configureSession(*request);

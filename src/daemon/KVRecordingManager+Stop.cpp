@@ -58,10 +58,14 @@ void KVRecordingManager::recordingSessionStoppedWithError(const SessionRef& sess
                                                           const OptionalError& error,
                                                           const std::optional<URL>& movieURL) {
     KVLog("KVRecordingManager:recordingSessionStoppedWithError:movieURL:");
-    // A broadcast's own alert leads to its extension's application, which nobody can look up yet.
-    if (session && session->isSystemRecording() && !session->broadcastExtension()) {
-        showOnAlertQueue([session, error](KVRecordingManager& manager) {
-            manager.showAlertForRecordingSession(session, error);
+    if (session && session->isSystemRecording()) {
+        const bool isBroadcast = session->broadcastExtension() != nullptr;
+        showOnAlertQueue([session, error, isBroadcast](KVRecordingManager& manager) {
+            if (isBroadcast) {
+                manager.showAlertForBroadcastSession(session, error);
+            } else {
+                manager.showAlertForRecordingSession(session, error);
+            }
         });
     }
     clearSystemRecordingUI(session);

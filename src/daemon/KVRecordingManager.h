@@ -50,6 +50,11 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
     /// Accepts clients from now on. Once, right after `create`.
     void finishStartup();
 
+    /// The process is about to end: finishes every recording and saves that of the whole screen, refuses new
+    /// ones, and calls `done`, on whatever thread, when all that and every stop and save under way is over. A
+    /// movie that is finished and not saved lies in the store then. Any thread; once.
+    void finishForTermination(std::function<void()> done);
+
     /// The queue on which every blocking alert is shown; one for the process.
     static SerialQueue& kelvoAlertQueue();
 
@@ -104,6 +109,16 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
     // Alerts about system recordings, on the alert queue, which they block until they are answered.
     void showAlertForRecordingSession(const SessionRef& session, const OptionalError& error);
     void showAlertRecordingSessionFailedToSaveFile(const SessionRef& session, const OptionalError& error);
+    /// Cannot lead the user to the extension's application yet, and so is only logged.
+    void showAlertForBroadcastSession(const SessionRef& session, const OptionalError& error);
+    /// Whether the user lets a paused broadcast go on: nobody can be asked yet, and it does. Caller's thread.
+    bool showResumeBroadcastAlertWithSession(const SessionRef& session, std::uint32_t contextID);
+
+    // The bulletin about a saved recording, on the bulletin service's queue but for its making.
+    BulletinRequest createBulletinRequestWithAssetURL(const std::string& localIdentifier);
+    void handleBulletinActionResponse(const std::string& actionIdentifier) override;
+    BulletinSection bulletinSection() override;
+    std::string sectionIdentifier() const;
 
     // Client requests, on the connection manager's queue. One that the daemon does not offer yet is answered
     // with an error of the domain; without a handler to tell it to, it is logged and does nothing.
@@ -243,12 +258,36 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
                            const ErrorHandler& completion);
     void displayScreenRecorderBulletinWithURL(const std::string& localIdentifier);
 
+    /// What must come to its end before the process does. Held by every stop and save under way; calls what
+    /// it was given when the last of them is over.
+    struct Work {
+        ~Work() {
+            if (onEnd) onEnd();
+        }
+        std::function<void()> onEnd;  // set by the one who has taken it out of the manager
+    };
+    using WorkRef = std::shared_ptr<Work>;
+    /// None once the process is about to end.
+    WorkRef work() const { return work_.copy(); }
+    bool isTerminating() const { return !work(); }
+    /// `handler`, which may be none, holding the work until it is dropped.
+    template <typename... Arguments>
+    std::function<void(Arguments...)> endingWork(std::function<void(Arguments...)> handler) const {
+        return [work = work(), handler = std::move(handler)](Arguments... arguments) {
+            if (handler) handler(arguments...);
+        };
+    }
+    void finishRecordings(const WorkRef& work);
+    void finishRecording(const SessionRef& session, const WorkRef& work);
+    void logMoviesLeftBehind();
+
     const Platform platform_;
     const std::shared_ptr<KVLocalization> localization_;
     const std::shared_ptr<KVUserErrors> errors_;
     const std::shared_ptr<KVTemporaryFileStore> fileStore_;
 
     const std::shared_ptr<KVAudioMixUtility> mixer_;
+    Guarded<WorkRef> work_{std::make_shared<Work>()};
     std::shared_ptr<KVConnectionManager> connectionManager_;
     std::shared_ptr<IPCListener> publicListener_;
     std::shared_ptr<KVSessionManager> sessionManager_;

@@ -35,6 +35,7 @@ class OptionReader {
         if (name_ == "--root") return readText(options_.root);
         if (name_ == "--resources") return readText(options_.resourceFolder);
         if (name_ == "--log") return readLog();
+        if (name_ == "--user-videos") return readFlag(options_.savesToUsersVideos);
         if (argument.starts_with("-")) return wrong("unknown option " + name_);
         return wrong("unexpected argument " + std::string(argument));
     }
@@ -42,6 +43,12 @@ class OptionReader {
     OptionalError choose(Options::Action action) {
         if (inlineValue_) return wrong(name_ + " takes no value");
         options_.action = action;
+        return std::nullopt;
+    }
+
+    OptionalError readFlag(bool& flag) const {
+        if (inlineValue_) return wrong(name_ + " takes no value");
+        flag = true;
         return std::nullopt;
     }
 
@@ -80,11 +87,14 @@ Result<Options> Options::parse(std::span<const char* const> arguments) {
 }
 
 const char* Options::helpText() {
-    return "Usage: kelvod [--root DIR] [--log journal|stderr] [--resources DIR]\n"
+    return "Usage: kelvod [--root DIR] [--user-videos] [--log journal|stderr] [--resources DIR]\n"
            "\n"
            "Records the screen for the applications and the shell of this device.\n"
            "\n"
            "  --root DIR         keep everything of the device under DIR instead of /\n"
+           "  --user-videos      save recordings to the own videos folder of the user who runs the daemon, "
+           "not\n"
+           "                     to the one under DIR\n"
            "  --log SINK         log to the journal (the default) or to standard error\n"
            "  --resources DIR    the folder with KelvoKit.framework, if not the installed one\n"
            "  --version          print the version and exit\n"

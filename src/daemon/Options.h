@@ -16,6 +16,7 @@ struct Options {
     Log log = Log::journal;
     std::string root = "/";
     std::string resourceFolder;  ///< empty: the installed one
+    bool savesToUsersVideos = false;
 
     /// Reads the arguments behind the program's name. The error's description says which one is wrong and
     /// how.

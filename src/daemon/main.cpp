@@ -14,6 +14,7 @@
 
 #include <atomic>
 #include <cerrno>
+#include <chrono>
 #include <cstdio>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -22,6 +23,10 @@ namespace kelvo {
 namespace {
 
 constexpr const char* kLockPath = "/run/kelvod/lock";
+
+/// How long the end may take: what is left of it after the recordings' share goes to the tear-down.
+constexpr std::chrono::milliseconds kPatience{4500};
+constexpr unsigned kLongestEnd = 5;
 
 int cannotStart(const std::string& reason, int status) {
     std::fprintf(stderr, "kelvod: %s\n", reason.c_str());
@@ -48,12 +53,13 @@ int run(const Options& options) {
     // A root that cannot be written is better known now than when somebody wants to record.
     const OptionalError error = makeWritableDirectory(root->hostPath(KVTemporaryFileStore::_srTempPath()));
     if (error) return cannotUseRoot(options, *error);
-    Platform platform = linuxPlatform(root, KVTemporaryFileStore::_srTempPath());
+    Platform platform = linuxPlatform(root, KVTemporaryFileStore::_srTempPath(), options.savesToUsersVideos);
     platform.alerts = ShellAlerts::create(platform.ipc);
 
-    signals.watch([&isTerminated, mainQueue = platform.mainQueue] {
+    signals.watch([&isTerminated, platform] {
         isTerminated = true;
-        mainQueue->stop();
+        TerminationSignals::exitAfter(kLongestEnd);
+        endDaemon(platform, kPatience);
     });
     const int status = runDaemon(platform, recordingSessionFactory(platform), reportReadiness);
     return isTerminated ? 0 : status;

@@ -38,7 +38,9 @@ void KVClientProxy::recordingDidStopWithError(const OptionalError& error,
                                               const std::optional<URL>& movieURL) {
     sendTo(connection(), "KVClientProxy:recordingDidStopWithError:movieURL:",
            "KVClientProxy:recordingDidStopWithError: error getting remote proxy",
-           [&](auto& client) { client.recordingDidStopWithError(error, movieURL); });
+           [&, client = connection()](auto& remote) {
+               remote.recordingDidStopWithError(error, urlForPeer(*client, movieURL));
+           });
 }
 
 void KVClientProxy::updateBroadcastServiceInfo(const Dictionary& serviceInfo) {

@@ -12,6 +12,17 @@ bool holds(const IPCConnectionRef& connection, std::string_view entitlement) {
     return connection && connection->valueForEntitlement(entitlement).asBool().value_or(false);
 }
 
+/// Gives `handler` the movie where the client finds it.
+MovieHandler forPeer(const IPCConnectionRef& connection, MovieHandler handler) {
+    if (!connection || !handler) return handler;
+    return [weakConnection = std::weak_ptr(connection), handler = std::move(handler)](const auto& movieURL,
+                                                                                      const auto& error) {
+        // Nobody waits for an answer whose connection is gone.
+        const auto peer = weakConnection.lock();
+        handler(peer ? urlForPeer(*peer, movieURL) : movieURL, error);
+    };
+}
+
 }  // namespace
 
 template <typename Forward>
@@ -72,20 +83,24 @@ void KVConnectionManager::getSystemBroadcastExtensionInfo(ExtensionsHandler hand
 }
 
 void KVConnectionManager::stopRecordingWithHandler(MovieHandler handler) {
+    MovieHandler answered = forPeer(transport_->currentConnection(), std::move(handler));
     serve("stopRecordingWithHandler",
-          [&](auto& owner) { owner.stopRecordingWithHandler(std::move(handler)); });
+          [&](auto& owner) { owner.stopRecordingWithHandler(std::move(answered)); });
 }
 
 void KVConnectionManager::stopRecordingWithStartClipDuration(double startClipDuration, double endClipDuration,
                                                              MovieHandler handler) {
+    MovieHandler answered = forPeer(transport_->currentConnection(), std::move(handler));
     serve("stopRecordingWithStartClipDuration", [&](auto& owner) {
-        owner.stopRecordingWithStartClipDuration(startClipDuration, endClipDuration, std::move(handler));
+        owner.stopRecordingWithStartClipDuration(startClipDuration, endClipDuration, std::move(answered));
     });
 }
 
 void KVConnectionManager::saveVideoToCameraRoll(const URL& movieURL, ErrorHandler handler) {
+    const IPCConnectionRef connection = transport_->currentConnection();
+    const URL url = connection ? connection->urlFromPeer(movieURL) : movieURL;
     serve("saveVideoToCameraRoll",
-          [&](KVDaemonProtocol& owner) { owner.saveVideoToCameraRoll(movieURL, std::move(handler)); });
+          [&](KVDaemonProtocol& owner) { owner.saveVideoToCameraRoll(url, std::move(handler)); });
 }
 
 void KVConnectionManager::pauseRecording() {

@@ -33,12 +33,13 @@ void KVMultipleClientProxy::resetConnectionWithProcessIdentifier(std::int32_t pr
     }
 }
 
+/// `send` gets each client and its connection.
 template <typename Send>
 void KVMultipleClientProxy::sendToEveryone(const char* failureText, Send send) {
     const std::lock_guard lock(lock_);
     for (const IPCConnectionRef& connection : connectionSet_) {
         RemoteClient client = remoteClient(*connection, failureText);
-        send(client);
+        send(client, *connection);
     }
 }
 
@@ -58,26 +59,28 @@ void KVMultipleClientProxy::recordingDidStopWithError(const OptionalError& error
                                                       const std::optional<URL>& movieURL) {
     KVLog("KVMultipleClientProxy:recordingDidStopWithError:movieURL:");
     sendToEveryone("KVMultipleClientProxy:recordingDidStopWithError: error getting remote proxy",
-                   [&](auto& client) { client.recordingDidStopWithError(error, movieURL); });
+                   [&](auto& client, const IPCConnection& connection) {
+                       client.recordingDidStopWithError(error, urlForPeer(connection, movieURL));
+                   });
 }
 
 void KVMultipleClientProxy::updateBroadcastURL(const URL& broadcastURL) {
     KVLog("KVMultipleClientProxy:updateBroadcastURL:");
     sendToEveryone("KVMultipleClientProxy:updateBroadcastURL: error getting remote proxy",
-                   [&](auto& client) { client.updateBroadcastURL(broadcastURL); });
+                   [&](auto& client, const auto&) { client.updateBroadcastURL(broadcastURL); });
 }
 
 /// The failure's text names another message, and misspells it; readers of logs know it so.
 void KVMultipleClientProxy::recordingLockInterrupted(const KVError& error) {
     KVLog("KVMultipleClientProxy:recordingLockInterrupted:");
     sendToEveryone("KVMultipleClientProxy:recodingDidStopAndSavedToCameraRoll: video saved to camera roll",
-                   [&](auto& client) { client.recordingLockInterrupted(error); });
+                   [&](auto& client, const auto&) { client.recordingLockInterrupted(error); });
 }
 
 void KVMultipleClientProxy::recordingTimerDidUpdate(const std::string& timerText) {
     KVLog("KVMultipleClientProxy:recordingTimerDidUpdate:");
     sendToEveryone("KVMultipleClientProxy:recordingTimerDidUpdate: error getting remote proxy",
-                   [&](auto& client) { client.recordingTimerDidUpdate(timerText); });
+                   [&](auto& client, const auto&) { client.recordingTimerDidUpdate(timerText); });
 }
 
 void KVMultipleClientProxy::recordingShouldResume() {

@@ -138,9 +138,19 @@ void ShellAlerts::forget(Identifier identifier) {
     state_.with([&](State& state) { state.shown.erase(identifier); });
 }
 
+void ShellAlerts::close() {
+    const auto shown = state_.with([](State& state) {
+        state.isClosed = true;
+        return state.shown;
+    });
+    for (const auto& [identifier, weakAlert] : shown) {
+        if (const auto alert = weakAlert.lock()) alert->cancel();
+    }
+}
+
 Result<std::shared_ptr<SystemAlert>> ShellAlerts::createAlert(const SystemAlertContent& content) {
     const auto alert = state_.with([&](State& state) {
-        if (!state.shell) return std::shared_ptr<Alert>();
+        if (!state.shell || state.isClosed) return std::shared_ptr<Alert>();
         const Identifier identifier = ++state.lastIdentifier;
         auto created = std::make_shared<Alert>(weak_from_this(), state.shell, identifier);
         state.shown.emplace(identifier, created);

@@ -21,6 +21,7 @@ class ShellAlerts : public SystemAlertService,
     static std::shared_ptr<ShellAlerts> create(const std::shared_ptr<IPCTransport>& transport);
 
     Result<std::shared_ptr<SystemAlert>> createAlert(const SystemAlertContent& content) override;
+    void close() override;
 
     bool listenerShouldAcceptNewConnection(IPCListener& listener,
                                            const IPCConnectionRef& connection) override;
@@ -33,6 +34,7 @@ class ShellAlerts : public SystemAlertService,
         IPCConnectionRef shell;
         Identifier lastIdentifier = 0;
         std::map<Identifier, std::weak_ptr<Alert>> shown;
+        bool isClosed = false;
     };
 
     explicit ShellAlerts(const std::shared_ptr<IPCTransport>& transport);

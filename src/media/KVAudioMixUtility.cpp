@@ -19,7 +19,8 @@ AudioMix mixOfAllAudioTracks(const Asset* asset) {
 }  // namespace
 
 URL KVAudioMixUtility::tempFileURL() const {
-    const std::string prefix = KVTemporaryFileStore::_srTempPath() + "/KVKelvo_Final";
+    const std::string prefix =
+        KVTemporaryFileStore::_srTempPath() + "/" + std::string(KVTemporaryFileStore::kMixedMoviePrefix);
     const auto stamp = static_cast<std::int64_t>(clock_->now().secondsSince1970());
     return URL::file(prefix + std::to_string(stamp) + ".mp4");
 }

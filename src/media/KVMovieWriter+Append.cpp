@@ -25,6 +25,7 @@ bool KVMovieWriter::appendInitialSampleBuffer(const SampleBufferRef& sample,
     const MediaTime time = sample->presentationTime();
     if (!time.isValid()) return true;
     writer->startSession(time);
+    writer->relateTimes(sample->captureTime(), time);
     if (input && input->isReadyForMoreMediaData()) {
         input->append(sample);
         didProcessFirstSample_ = true;
@@ -50,6 +51,8 @@ bool KVMovieWriter::dispatchedAppendVideoSampleBuffer(const SampleBufferRef& sam
     const std::shared_ptr<MediaFileWriter> writer = assetWriter();
     if (!sample || !writer || isFinishingWriting_) return true;
     if (isTakingSamples()) {
+        // Told here, as a frame that is discarded may be the only one for long that knows of a pause.
+        writer->relateTimes(sample->captureTime(), sample->presentationTime());
         if (video_.bufferQueue->enqueue(sample) != 0) {
             KVLog("ERROR Enqueing the Sample Video Buffer");
         } else {

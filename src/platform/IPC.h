@@ -2,12 +2,14 @@
 
 #include "base/KVError.h"
 #include "base/Result.h"
+#include "base/URL.h"
 #include "base/Value.h"
 #include "platform/IPCInterface.h"
 
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <optional>
 #include <string_view>
 
 namespace kelvo {
@@ -53,6 +55,10 @@ class IPCConnection {
     /// name.
     virtual Value valueForEntitlement(std::string_view name) const = 0;
 
+    /// A file of this device as the peer finds it, and the other way round. Other URLs stay as they are.
+    virtual URL urlForPeer(const URL& url) const = 0;
+    virtual URL urlFromPeer(const URL& url) const = 0;
+
     /// What the peer may send, and who serves it. Before `resume`.
     virtual void setExported(std::shared_ptr<const IPCInterface> interface,
                              std::shared_ptr<IPCExportedObject> object) = 0;
@@ -76,6 +82,10 @@ class IPCConnection {
 };
 
 using IPCConnectionRef = std::shared_ptr<IPCConnection>;
+
+inline std::optional<URL> urlForPeer(const IPCConnection& connection, const std::optional<URL>& url) {
+    return url ? std::optional(connection.urlForPeer(*url)) : std::nullopt;
+}
 
 class IPCListener;
 

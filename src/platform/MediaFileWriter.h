@@ -16,9 +16,9 @@ enum class MediaFileType { mpeg4 };
 /// Writes one movie file from the samples given to its inputs. Implemented by the Linux media adapter and the
 /// simulated device; driven by a movie writer. Thread-safe.
 ///
-/// Order of calls: `addInput` for each track, `startWriting`, `startSession`, samples to the inputs,
-/// optionally `endSession`, `finishWriting`. A writer serves one file. One that is destroyed before it
-/// finished leaves the file as it lies, playable up to its last fragment.
+/// Order of calls: `addInput` for each track, `startWriting`, `startSession`, samples to the inputs and
+/// `relateTimes`, optionally `endSession`, `finishWriting`. A writer serves one file. One that is destroyed
+/// before it finished leaves the file as it lies, playable up to its last fragment.
 class MediaFileWriter {
   public:
     /// The numbers are the ones that logs show.
@@ -43,6 +43,13 @@ class MediaFileWriter {
 
     /// The movie's timeline begins at `sourceTime`: what lies before it is not in the movie.
     virtual void startSession(const MediaTime& sourceTime) = 0;
+
+    /// What was captured at `captureTime` of the host's clock is presented at `sourceTime`: told for each
+    /// frame, in their order, whether or not it is appended. Where the two part (a pause was cut out of the
+    /// frames' times), the times of sound, which are those of its capture, are moved as the frames' were:
+    /// what sounded between the last frame before the change and the first one after it is not in the movie,
+    /// but for what was written before the change was told; that stays, and what would lie over it is cut.
+    virtual void relateTimes(const MediaTime& captureTime, const MediaTime& sourceTime) = 0;
 
     /// The movie ends at `sourceTime`: what lies at or after it is not in the movie, whether it was appended
     /// already or not.

@@ -6,6 +6,7 @@
 
 #include <optional>
 #include <string_view>
+#include <vector>
 
 namespace kelvo {
 
@@ -23,6 +24,9 @@ class PhotoLibrary {
 
     /// The asset with this local identifier; none when there is none (any more).
     virtual std::optional<PhotoAsset> assetWithLocalIdentifier(std::string_view localIdentifier) = 0;
+
+    /// Every asset, oldest first. Fails when the library cannot be read.
+    virtual Result<std::vector<PhotoAssetDetails>> assets() = 0;
 
     /// Removes the asset and its file. An asset that is gone already is an error.
     virtual OptionalError deleteAsset(const PhotoAsset& asset) = 0;

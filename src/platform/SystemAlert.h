@@ -37,6 +37,8 @@ class SystemAlertService {
     virtual ~SystemAlertService() = default;
     /// Puts an alert on the screen. Fails when nobody can show it.
     virtual Result<std::shared_ptr<SystemAlert>> createAlert(const SystemAlertContent& content) = 0;
+    /// Cancels every alert that is up, and creates none from now on: nobody is left to wait for the user.
+    virtual void close() = 0;
 };
 
 }  // namespace kelvo

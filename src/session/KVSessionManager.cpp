@@ -122,15 +122,21 @@ void KVSessionManager::stopRecordingSession(const SessionRef& session, double st
             const auto stillOwner = weakOwner.lock();
             if (!stillOwner) return;
             if (!movieURL && error) stillOwner->failedToSaveRecordingForRecordingSession(session, *error);
-            stillOwner->resetStatesForSession(session);
+            reset(*stillOwner, session);
         });
+}
+
+/// A handler may have started the session's next recording, which would go on unseen and unstoppable if it
+/// were reset.
+void KVSessionManager::reset(KVSessionManagerDelegate& owner, const SessionRef& session) {
+    if (!session->isRecording()) owner.resetStatesForSession(session);
 }
 
 void KVSessionManager::discardRecording(const SessionRef& session) {
     KVLog("recording stopped without handler!");
     session->finishAndCleanupSessionFilesWithHandler([session, weakOwner = std::weak_ptr(delegate())] {
         tellClient(session, [](auto& client) { client.updateScreenRecordingState(); });
-        if (const auto owner = weakOwner.lock()) owner->resetStatesForSession(session);
+        if (const auto owner = weakOwner.lock()) reset(*owner, session);
     });
 }
 
@@ -192,7 +198,7 @@ void KVSessionManager::interruptOtherRecordingSessionAgainstSession(const Sessio
             KVLog("interrupted session");
             tellClient(other, [&](auto& client) { client.recordingDidStopWithError(error, movieURL); });
             other->setInterruptedMovieURL(movieURL);
-            if (const auto owner = delegate()) owner->resetStatesForSession(other);
+            if (const auto owner = delegate()) reset(*owner, other);
         });
     }
 }

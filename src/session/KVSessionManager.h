@@ -80,6 +80,7 @@ class KVSessionManager {
         std::map<std::string, SessionRef> bundleIDToRecordingSessionLookup;
     };
 
+    static void reset(KVSessionManagerDelegate& owner, const SessionRef& session);
     void discardRecording(const SessionRef& session);
     void saveVideo(const std::optional<URL>& movieURL);
 

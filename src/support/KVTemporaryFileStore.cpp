@@ -3,6 +3,7 @@
 #include "base/GlobalQueue.h"
 #include "base/KVLog.h"
 
+#include <filesystem>
 #include <utility>
 
 namespace kelvo {
@@ -36,6 +37,21 @@ KVTemporaryFileStore::KVTemporaryFileStore(std::shared_ptr<FileSystem> fileSyste
 
 std::string KVTemporaryFileStore::_srTempPath() {
     return std::string(kStorePath);
+}
+
+bool KVTemporaryFileStore::isInStore(const URL& url) {
+    const std::filesystem::path path = std::filesystem::path(url.path()).lexically_normal();
+    return path.has_filename() && path.filename() != ".." &&
+           path.parent_path() == std::filesystem::path(kStorePath).parent_path();
+}
+
+std::vector<URL> KVTemporaryFileStore::movies() {
+    std::vector<URL> found;
+    for (const std::string& name : fileSystem_->namesInDirectory(kStorePath).valueOr({})) {
+        if (name.ends_with(".mp4") && !name.starts_with(kMixedMoviePrefix))
+            found.push_back(URL::file(pathInStore(name)));
+    }
+    return found;
 }
 
 void KVTemporaryFileStore::_srSetupTempDirectory() {

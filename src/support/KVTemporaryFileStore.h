@@ -10,6 +10,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace kelvo {
 
@@ -25,6 +26,16 @@ class KVTemporaryFileStore {
 
     /// The store's path, with its trailing slash. A file's path is this, another slash and its name.
     static std::string _srTempPath();
+
+    /// How the names of mixed movies begin.
+    static constexpr std::string_view kMixedMoviePrefix = "KVKelvo_Final";
+
+    /// Whether the URL is that of a file in the store, whether or not there is one.
+    static bool isInStore(const URL& url);
+
+    /// The movies that lie in the store and can be saved: not those that a mix had just begun to write. In
+    /// alphabetical order; none when the store cannot be read. Caller's thread.
+    std::vector<URL> movies();
 
     /// Creates the directory when nothing stands at its path. Caller's thread.
     void _srSetupTempDirectory();

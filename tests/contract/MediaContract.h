@@ -148,6 +148,34 @@ TYPED_TEST_P(MediaContract, EndedSessionEndsTheMovie) {
     EXPECT_NEAR(this->media().openAsset(URL::file(this->path))->duration().seconds(), 0.5, 0.001);
 }
 
+TYPED_TEST_P(MediaContract, SoundOfWhatTheFramesSkipIsNotInTheMovie) {
+    TestMovie movie = this->movie();
+    ASSERT_TRUE(movie.start());
+    // Two stretches of half a second, four seconds apart, that follow one another in the frames' times.
+    for (int i = 0; i <= 30; ++i) {
+        const double presented = (i <= 15 ? i : i - 1) / 30.0;
+        const double captured = i <= 15 ? presented : presented + 4;
+        const MediaTime captureTime = MediaTime::make(movie.timeAt(captured), 1000000000);
+        movie.writer()->relateTimes(captureTime, MediaTime::make(movie.timeAt(presented), 1000000000));
+        const auto frame = testFrame({320, 240}, i, movie.timeAt(presented));
+        if (i != 16) movie.appendWhenReady(movie.video(), frame);
+        movie.appendWhenReady(movie.audio1(), testTone(movie.timeAt(captured), 1470));
+        movie.appendWhenReady(movie.audio2(), testTone(movie.timeAt(captured), 1470));
+    }
+    EXPECT_EQ(movie.finish(), TestFixture::Status::completed);
+    EXPECT_NEAR(this->media().openAsset(URL::file(this->path))->duration().seconds(), 1, 0.1);
+}
+
+TYPED_TEST_P(MediaContract, TimesThatAreNotValidRelateNothing) {
+    TestMovie movie = this->movie();
+    ASSERT_TRUE(movie.start());
+    movie.writer()->relateTimes(MediaTime::invalid(), MediaTime::make(1, 1));
+    movie.writer()->relateTimes(MediaTime::make(1, 1), MediaTime::invalid());
+    movie.recordUntil(0.5);
+    EXPECT_EQ(movie.finish(), TestFixture::Status::completed);
+    EXPECT_NEAR(this->media().openAsset(URL::file(this->path))->duration().seconds(), 0.5, 0.1);
+}
+
 TYPED_TEST_P(MediaContract, MissingMovieIsNoAsset) {
     EXPECT_EQ(this->media().openAsset(URL::file(this->path)), nullptr);
     EXPECT_EQ(this->media().openAsset(URL("https://example.com/movie.mp4")), nullptr);
@@ -205,8 +233,9 @@ REGISTER_TYPED_TEST_SUITE_P(MediaContract, BufferQueueKeepsTheOrderOfArrival, Re
                             InputRemembersHowItWasMade, WriterNeedsAFile,
                             WriterGoesFromUnknownToWritingToCompleted, WriterStartsOnce,
                             WriterDoesNotOverwrite, InputTakesSamplesOnlyWithinTheSession,
-                            FinishedMovieOpensAsAnAsset, EndedSessionEndsTheMovie, MissingMovieIsNoAsset,
-                            ExportWithoutAnAssetFails, ExportOfANegativeDurationFails, ExportDoesNotOverwrite,
-                            PassThroughKeepsAllTracksOfTheRange, MixHasOneAudioTrack);
+                            FinishedMovieOpensAsAnAsset, EndedSessionEndsTheMovie,
+                            SoundOfWhatTheFramesSkipIsNotInTheMovie, TimesThatAreNotValidRelateNothing,
+                            MissingMovieIsNoAsset, ExportWithoutAnAssetFails, ExportOfANegativeDurationFails,
+                            ExportDoesNotOverwrite, PassThroughKeepsAllTracksOfTheRange, MixHasOneAudioTrack);
 
 }  // namespace kelvo::test

@@ -78,6 +78,24 @@ TYPED_TEST_P(PhotoLibraryContract, DeletedAssetIsGone) {
     EXPECT_EQ(again->code(), ENOENT);
 }
 
+TYPED_TEST_P(PhotoLibraryContract, AssetsAreListedWithWhatTheyAre) {
+    ASSERT_TRUE(this->world.library().assets());
+    EXPECT_TRUE(this->world.library().assets()->empty());
+    const auto first = this->create();
+    const auto second = this->create();
+    ASSERT_TRUE(first && second);
+    auto assets = this->world.library().assets();
+    ASSERT_TRUE(assets);
+    ASSERT_EQ(assets->size(), 2U);
+    EXPECT_LE(assets->front().creationDate, assets->back().creationDate);
+    EXPECT_GT(assets->front().creationDate, Date());
+    EXPECT_GT(assets->front().size, 0U);
+    EXPECT_EQ(this->world.library().deleteAsset(*first), std::nullopt);
+    assets = this->world.library().assets();
+    ASSERT_EQ(assets->size(), 1U);
+    EXPECT_EQ(assets->front().asset, *second);
+}
+
 TYPED_TEST_P(PhotoLibraryContract, UnknownIdentifiersAreNoAssets) {
     EXPECT_EQ(this->world.library().assetWithLocalIdentifier(""), std::nullopt);
     EXPECT_EQ(this->world.library().assetWithLocalIdentifier("unknown"), std::nullopt);
@@ -87,6 +105,7 @@ TYPED_TEST_P(PhotoLibraryContract, UnknownIdentifiersAreNoAssets) {
 REGISTER_TYPED_TEST_SUITE_P(PhotoLibraryContract, NewAssetIsFoundByItsIdentifier,
                             AssetOutlivesTheMovieThatItWasMadeFrom, EachAssetHasAnIdentifierOfItsOwn,
                             IdentifierIsNotUsedAgain, MissingMovieIsAnError, WhatIsNoFileIsAnError,
-                            DeletedAssetIsGone, UnknownIdentifiersAreNoAssets);
+                            DeletedAssetIsGone, AssetsAreListedWithWhatTheyAre,
+                            UnknownIdentifiersAreNoAssets);
 
 }  // namespace kelvo::test

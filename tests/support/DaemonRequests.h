@@ -26,7 +26,8 @@ inline Value valueOf(const OptionalError& error) {
     return error ? Value(*error) : Value();
 }
 
-/// All nineteen, each with arguments unlike the default.
+/// All nineteen, each with arguments unlike the default. The movies are no files, which each transport names
+/// as its peer finds them.
 inline std::vector<DaemonRequest> daemonRequests() {
     using D = KVDaemonProtocol;
     using Answer = std::function<void(Array)>;
@@ -74,7 +75,7 @@ inline std::vector<DaemonRequest> daemonRequests() {
              });
          },
          {},
-         Array{URL("file:///movie.mp4"), Value()}},
+         Array{URL("movie:taken"), Value()}},
         {"stopRecordingWithStartClipDuration",
          [](D& d, const Answer& answered) {
              d.stopRecordingWithStartClipDuration(1.25, 2.5, [=](const auto& movieURL, const auto& e) {
@@ -85,10 +86,9 @@ inline std::vector<DaemonRequest> daemonRequests() {
          Array{Value(), error}},
         {"saveVideoToCameraRoll",
          [](D& d, const Answer& answered) {
-             d.saveVideoToCameraRoll(URL("file:///a.mp4"),
-                                     [=](const OptionalError& e) { answered({valueOf(e)}); });
+             d.saveVideoToCameraRoll(URL("movie:a"), [=](const OptionalError& e) { answered({valueOf(e)}); });
          },
-         {URL("file:///a.mp4")},
+         {URL("movie:a")},
          Array{error}},
         {"pauseRecording", [](D& d, const Answer&) { d.pauseRecording(); }, {}, {}},
         {"resumeRecordingWithWindowLayerContextID",

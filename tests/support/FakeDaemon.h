@@ -52,7 +52,7 @@ class FakeDaemon : public KVConnectionManagerDelegate {
         if (keepsStopHandler)
             keptStopHandler.set(std::exchange(handler, nullptr));  // before a waiting test is woken
         note("stopRecordingWithHandler");
-        if (handler) handler(URL("file:///movie.mp4"), std::nullopt);
+        if (handler) handler(URL("movie:taken"), std::nullopt);
     }
     void stopRecordingWithStartClipDuration(double startClipDuration, double endClipDuration,
                                             MovieHandler handler) override {

@@ -30,6 +30,14 @@ class SimulatedConnection : public ConnectionBase {
         return value != nullptr ? *value : Value();
     }
 
+    URL urlForPeer(const URL& url) const override { return URL(url.absoluteString() + peerSuffix); }
+    URL urlFromPeer(const URL& url) const override {
+        const std::string& text = url.absoluteString();
+        return URL(text.ends_with(peerSuffix) ? text.substr(0, text.size() - peerSuffix.size()) : text);
+    }
+    /// Stands behind every URL as the peer sees it, so that a test sees whether it was translated.
+    std::string peerSuffix;
+
     /// Sends a message as a peer could that keeps no rule: the arguments need not fit.
     void sendRaw(std::size_t method, const Array& arguments);
     /// Waits until everything has run that arrived so far; says how much that was since the connection began.

@@ -118,7 +118,10 @@ SimulatedMovie SimulatedFileWriter::movie() const {
         movie.tracks.push_back(input->mediaType());
         if (sessionEnd().isValid()) continue;
         for (const SampleBufferRef& sample : input->samples()) {
-            const MediaTime sampleEnd = sample->presentationTime() + sample->duration();
+            // Sound that was cut out has no end.
+            const MediaTime begin = sample->isVideo() ? sample->presentationTime()
+                                                      : timeline_.sourceTime(sample->presentationTime());
+            const MediaTime sampleEnd = begin + sample->duration();
             if (!end.isValid() || compare(sampleEnd, end) > 0) end = sampleEnd;
         }
     }

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/Guarded.h"
+#include "base/MovieTimeline.h"
 #include "platform/BufferQueue.h"
 #include "platform/MediaFileWriter.h"
 #include "platform/simulated/SimulatedFaults.h"
@@ -96,6 +97,8 @@ class SimulatedFileWriter : public MediaFileWriter, public std::enable_shared_fr
     /// Invalid until the session begins or is ended.
     MediaTime sessionStart() const { return sessionStart_.copy(); }
     MediaTime sessionEnd() const { return sessionEnd_.copy(); }
+    /// What `relateTimes` was told.
+    const MovieTimeline& timeline() const { return timeline_; }
 
     void addInput(std::shared_ptr<WriterInput> input) override;
     Status status() const override { return state_->status; }
@@ -103,6 +106,9 @@ class SimulatedFileWriter : public MediaFileWriter, public std::enable_shared_fr
     std::optional<URL> outputURL() const override { return url_; }
     bool startWriting() override;
     void startSession(const MediaTime& sourceTime) override;
+    void relateTimes(const MediaTime& captureTime, const MediaTime& sourceTime) override {
+        timeline_.relate(captureTime, sourceTime);
+    }
     void endSession(const MediaTime& sourceTime) override { sessionEnd_.set(sourceTime); }
     void finishWriting(std::function<void()> completion) override;
 
@@ -118,6 +124,7 @@ class SimulatedFileWriter : public MediaFileWriter, public std::enable_shared_fr
     Guarded<OptionalError> error_;
     Guarded<MediaTime> sessionStart_;
     Guarded<MediaTime> sessionEnd_;
+    MovieTimeline timeline_;
 };
 
 }  // namespace kelvo

@@ -17,12 +17,11 @@ std::string localIdentifier(int number) {
 
 Result<PhotoAsset> SimulatedPhotoLibrary::createVideoAsset(const URL& movieURL) {
     if (const OptionalError fault = faults_->take("PhotoLibrary.createVideoAsset")) return *fault;
-    if (!movieURL.isFileURL() || !fileSystem_->itemExists(movieURL.path())) {
-        return KVError::posix(ENOENT, movieURL.path());
-    }
+    const auto file = fileSystem_->attributesOfItem(movieURL.path());
+    if (!movieURL.isFileURL() || !file) return KVError::posix(ENOENT, movieURL.path());
     return content_.with([&](Content& content) {
         PhotoAsset asset{localIdentifier(++content.created)};
-        content.items.push_back({asset, movieURL.path()});
+        content.items.push_back({asset, movieURL.path(), file->modificationDate, file->size});
         return asset;
     });
 }
@@ -32,6 +31,14 @@ std::optional<PhotoAsset> SimulatedPhotoLibrary::assetWithLocalIdentifier(std::s
         if (item.asset.localIdentifier == localIdentifier) return item.asset;
     }
     return std::nullopt;
+}
+
+Result<std::vector<PhotoAssetDetails>> SimulatedPhotoLibrary::assets() {
+    if (const OptionalError fault = faults_->take("PhotoLibrary.assets")) return *fault;
+    std::vector<PhotoAssetDetails> details;
+    for (const Item& item : items())
+        details.push_back({item.asset, item.moviePath, item.creationDate, item.size});
+    return details;
 }
 
 OptionalError SimulatedPhotoLibrary::deleteAsset(const PhotoAsset& asset) {

@@ -12,12 +12,15 @@
 namespace kelvo {
 
 /// A photo library that remembers which movies it was given. Takes only files that exist; fails when
-/// "PhotoLibrary.createVideoAsset" or "PhotoLibrary.deleteAsset" was ordered to. Thread-safe.
+/// "PhotoLibrary.createVideoAsset", "PhotoLibrary.assets" or "PhotoLibrary.deleteAsset" was ordered to.
+/// Thread-safe.
 class SimulatedPhotoLibrary : public PhotoLibrary {
   public:
     struct Item {
         PhotoAsset asset;
         std::string moviePath;  ///< where the movie lay that it was made from
+        Date creationDate;
+        std::uint64_t size = 0;
     };
 
     SimulatedPhotoLibrary(std::shared_ptr<SimulatedFileSystem> fileSystem,
@@ -26,6 +29,7 @@ class SimulatedPhotoLibrary : public PhotoLibrary {
 
     Result<PhotoAsset> createVideoAsset(const URL& movieURL) override;
     std::optional<PhotoAsset> assetWithLocalIdentifier(std::string_view localIdentifier) override;
+    Result<std::vector<PhotoAssetDetails>> assets() override;
     OptionalError deleteAsset(const PhotoAsset& asset) override;
 
     /// What the library holds, oldest first.

@@ -17,14 +17,19 @@ class SimulatedBulletins : public BulletinService {
   public:
     std::shared_ptr<BulletinConnection> connect(std::string_view serviceName, SerialQueue& queue) override;
 
-    /// "connect NAME QUEUE", "register" and "withdraw all", in the order in which they came.
+    /// "connect NAME QUEUE", "register", "withdraw all", "post" and "interrupt", in the order in which they
+    /// came.
     std::vector<std::string> requests() const { return requests_->copy(); }
+    /// What was posted, in order.
+    std::vector<BulletinRequest> bulletins() const { return bulletins_->copy(); }
 
   private:
+    using Bulletins = Guarded<std::vector<BulletinRequest>>;
     using Requests = Guarded<std::vector<std::string>>;
     class Connection;
     class Proxy;
     std::shared_ptr<Requests> requests_ = std::make_shared<Requests>();
+    std::shared_ptr<Bulletins> bulletins_ = std::make_shared<Bulletins>();
 };
 
 /// A user who answers alerts as a test has decided beforehand, or while the alert is up. Thread-safe.
@@ -33,6 +38,8 @@ class SimulatedAlerts : public SystemAlertService {
     explicit SimulatedAlerts(std::shared_ptr<SimulatedFaults> faults) : faults_(std::move(faults)) {}
 
     Result<std::shared_ptr<SystemAlert>> createAlert(const SystemAlertContent& content) override;
+
+    void close() override;
 
     /// Answers the alert that is up, or else the next one.
     void answer(SystemAlertResponse response);
@@ -46,6 +53,7 @@ class SimulatedAlerts : public SystemAlertService {
         std::vector<SystemAlertContent> shown;
         std::deque<SystemAlertResponse> prepared;
         std::weak_ptr<Alert> current;
+        bool isClosed = false;
     };
     std::shared_ptr<SimulatedFaults> faults_;
     Guarded<Screen> screen_;

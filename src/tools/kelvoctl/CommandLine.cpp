@@ -21,7 +21,7 @@ struct CommandText {
     std::string_view help;
 };
 
-constexpr std::array<CommandText, 8> kCommands{{
+constexpr std::array<CommandText, 9> kCommands{{
     {Command::record, "record", "--seconds --microphone --output --size",
      "record the whole screen until Ctrl-C",
      "Usage: kelvoctl record [--seconds N] [--microphone] [--output FILE] [--size WxH]\n"
@@ -71,6 +71,16 @@ constexpr std::array<CommandText, 8> kCommands{{
      "Usage: kelvoctl extensions [--json]\n"
      "\n"
      "Lists the broadcast upload extensions that are installed: name and bundle identifier.\n"},
+    {Command::library, "library", "", "list the saved movies, or save what a crash left",
+     "Usage: kelvoctl library [recover] [--json]\n"
+     "\n"
+     "Lists the movies of the library, oldest first: when each was recorded, its size and its file. With "
+     "--json\n"
+     "each is an object with \"identifier\", \"path\", \"creationDate\" (seconds since 1970) and \"size\".\n"
+     "\n"
+     "  recover          save the movies that the daemon could not save before it ended, because of a crash\n"
+     "                   or a log-out, and take them out of its store. The exit status is 1 when one cannot\n"
+     "                   be saved; it stays in the store then\n"},
     {Command::watch, "watch", "", "print what the daemon tells the shell, as it comes",
      "Usage: kelvoctl watch [--json]\n"
      "\n"
@@ -165,6 +175,10 @@ class Reader {
     }
 
     OptionalError readCommand(std::string_view name) {
+        if (line_.command == Command::library && !line_.isRecovery && name == "recover") {
+            line_.isRecovery = true;
+            return std::nullopt;
+        }
         if (line_.command != Command::none) return wrong("unexpected argument " + std::string(name));
         const CommandText* const text = textNamed(name);
         if (text == nullptr) return wrong("unknown command " + std::string(name));

@@ -10,7 +10,7 @@
 
 namespace kelvo::ctl {
 
-enum class Command { none, record, stop, pause, resume, status, extensions, watch, shell };
+enum class Command { none, record, stop, pause, resume, status, extensions, library, watch, shell };
 
 /// What the command line asks for.
 struct CommandLine {
@@ -24,6 +24,7 @@ struct CommandLine {
     std::string output;
     std::optional<Size> size;
     std::optional<SystemAlertResponse> answer;
+    bool isRecovery = false;  ///< of `library`
 
     /// Reads the arguments behind the program's name. The error's description says which one is wrong and
     /// how. Options may stand before and behind the command; those that it does not take are errors.

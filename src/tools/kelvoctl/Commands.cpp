@@ -58,6 +58,8 @@ std::shared_ptr<void> beginCommand(Program& program) {
             return beginStatus(program);
         case Command::extensions:
             return beginExtensions(program);
+        case Command::library:
+            return beginLibrary(program);
         case Command::watch:
             return beginWatch(program);
         case Command::shell:

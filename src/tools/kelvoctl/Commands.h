@@ -15,6 +15,7 @@ std::shared_ptr<void> beginPause(Program& program);
 std::shared_ptr<void> beginResume(Program& program);
 std::shared_ptr<void> beginStatus(Program& program);
 std::shared_ptr<void> beginExtensions(Program& program);
+std::shared_ptr<void> beginLibrary(Program& program);
 std::shared_ptr<void> beginWatch(Program& program);
 std::shared_ptr<void> beginShell(Program& program);
 

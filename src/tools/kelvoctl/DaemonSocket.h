@@ -11,6 +11,9 @@ std::string daemonSocket(const std::string& given);
 /// The host path of the socket for shells that show alerts, beside that one.
 std::string alertSocket(const std::string& given);
 
+/// The host path of the socket of the library's service, beside that one.
+std::string librarySocket(const std::string& given);
+
 /// What a person is told when nobody listens there.
 std::string howToStart();
 

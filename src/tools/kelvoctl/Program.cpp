@@ -17,7 +17,8 @@ Program::~Program() {
 }
 
 int Program::run(TerminationSignals& signals) {
-    if (line_.command != Command::shell && !connect()) return status_;
+    const bool hasSocketOfItsOwn = line_.command == Command::shell || line_.command == Command::library;
+    if (!hasSocketOfItsOwn && !connect()) return status_;
     signals.watch([this] { mainQueue_.async([this] { interrupted(); }); });
     command_ = beginCommand(*this);
     if (!isFinished_) mainQueue_.run();

@@ -37,7 +37,7 @@ class Program {
     /// What ends the program when a request cannot be answered.
     std::function<void(const KVError&)> deliveryErrorHandler();
 
-    /// Only once the daemon is connected, as it is for every command but the shell.
+    /// Only once the daemon is connected, as it is for every command but those that `open` another socket.
     KVRemoteDaemon& daemon() { return *daemon_; }
     MainQueue& mainQueue() { return mainQueue_; }
     const SystemClock& clock() const { return clock_; }

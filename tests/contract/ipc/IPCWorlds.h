@@ -85,7 +85,7 @@ class SocketIPCWorld : public IPCWorldBase {
         ForeignSocket& process = *processes_.back();
         return {process.processIdentifier(),
                 std::make_shared<SocketConnection>(SocketConnection::Side::client, process.take(),
-                                                   clientLoop_, nullptr, nullptr)};
+                                                   clientLoop_, nullptr, nullptr, nullptr)};
     }
 
     bool comesTrue(const std::function<bool()>& condition) { return eventually(condition); }

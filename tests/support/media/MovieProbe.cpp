@@ -34,7 +34,8 @@ std::string outputOf(const std::string& command) {
 }
 
 std::string decodingComplaints(const std::string& path) {
-    return outputOf("ffmpeg -nostdin -v warning -i " + quoted(path) + " -map 0 -f null - 2>&1");
+    return outputOf("ffmpeg -nostdin -v warning -i " + quoted(path) +
+                    " -map 0 -fps_mode:v passthrough -enc_time_base:v -1 -f null - 2>&1");
 }
 
 std::string probeStream(const std::string& path, const std::string& stream, const std::string& entry) {

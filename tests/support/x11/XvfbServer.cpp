@@ -12,13 +12,15 @@ std::string XvfbServer::ownDisplay() {
     return ":" + std::to_string(kFirst + ::getpid() % kCount);
 }
 
-XvfbServer::XvfbServer(int width, int height, const std::string& display) : isNumberOurs_(!display.empty()) {
+XvfbServer::XvfbServer(int width, int height, const std::string& display, const std::string& options)
+    : isNumberOurs_(!display.empty()) {
     // Servers that start at once race to make the folder of their sockets.
     ::mkdir("/tmp/.X11-unix", 01777);
     ::chmod("/tmp/.X11-unix", 01777);
     // The server writes its number, and nothing else, to where the test reads.
     const std::string command = "exec Xvfb " + display + " -displayfd 3 -screen 0 " + std::to_string(width) +
-                                "x" + std::to_string(height) + "x24 -nolisten tcp -noreset 3>&2 2>/dev/null";
+                                "x" + std::to_string(height) + "x24 -nolisten tcp -noreset " + options +
+                                " 3>&2 2>/dev/null";
     process_ = std::make_unique<ChildProcess>(std::vector<std::string>{"sh", "-c", command});
     if (!process_->waitForLine("\n")) return;
     const std::string& answer = process_->output();

@@ -15,8 +15,8 @@ class XvfbServer {
     static std::string ownDisplay();
 
     /// Starts a server whose screen has this size and waits until it answers. `display` is ":N" to use that
-    /// number, or empty to take a free one.
-    XvfbServer(int width, int height, const std::string& display = {});
+    /// number, or empty to take a free one; `options` are further ones of the program.
+    XvfbServer(int width, int height, const std::string& display = {}, const std::string& options = {});
     ~XvfbServer();
     XvfbServer(const XvfbServer&) = delete;
     XvfbServer& operator=(const XvfbServer&) = delete;

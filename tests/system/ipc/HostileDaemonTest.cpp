@@ -122,7 +122,7 @@ class HostileDaemonTest : public testing::TestWithParam<Lie> {
 TEST_P(HostileDaemonTest, LosesItsClientWithOneLine) {
     auto [daemon, socket] = RawSocket::pair();
     const auto client = std::make_shared<SocketConnection>(SocketConnection::Side::client, std::move(socket),
-                                                           loop, nullptr, nullptr);
+                                                           loop, nullptr, nullptr, nullptr);
     client->setExported(interfaceOf<KVClientProtocol>(),
                         std::make_shared<ProtocolDispatcher<KVClientProtocol>>(callbacks));
     std::atomic<bool> isOver{false};

@@ -48,7 +48,7 @@ TEST_F(SocketTransportTest, EveryCallbackArrivesAsItWasSent) {
     const KVError error("domain", -5, {{"nested", Array{Value(), Date{5}, URL("u"), KVError("d", 1)}}});
     proxy.updateBroadcastServiceInfo({{"a", std::uint64_t{UINT64_MAX}}, {"b", Bytes(3)}});
     proxy.updateBroadcastURL(URL("rtmp://x"));
-    proxy.recordingDidStopWithError(error, URL("file:///m"));
+    proxy.recordingDidStopWithError(error, URL("movie:m"));
     proxy.recordingLockInterrupted(error);
     proxy.recordingShouldResume();
     proxy.recordingDidPause();
@@ -61,7 +61,7 @@ TEST_F(SocketTransportTest, EveryCallbackArrivesAsItWasSent) {
     proxy.captureHandlerWithAudioSample(sound, {}, 1024, SampleBuffer::Type::microphone, {});
     ASSERT_TRUE(eventually([&] { return client.callbacks->messages().size() == 9; }));
     using Stop = test::FakeClientProxy::Stop;
-    EXPECT_THAT(client.callbacks->stops.copy(), ElementsAre(Stop{error, URL("file:///m")}));
+    EXPECT_THAT(client.callbacks->stops.copy(), ElementsAre(Stop{error, URL("movie:m")}));
     EXPECT_THAT(client.callbacks->lockInterruptions.copy(), ElementsAre(error));
     EXPECT_THAT(client.callbacks->timerTexts.copy(), ElementsAre("00:01 é"));
     EXPECT_EQ(client.callbacks->audioSamples.copy().at(0).audioData, sound);

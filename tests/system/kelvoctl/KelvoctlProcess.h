@@ -7,12 +7,14 @@
 
 namespace kelvo::test {
 
-/// kelvoctl as its own process, on a socket. What it prints on both outputs is the process's `output`.
+/// kelvoctl as its own process, on a socket and, perhaps, a display. What it prints on both outputs is the
+/// process's `output`.
 class KelvoctlProcess : public ChildProcess {
   public:
     KelvoctlProcess(const std::string& socket, const std::vector<std::string>& arguments,
-                    const std::string& program = KELVOCTL_PROGRAM)
-        : ChildProcess(command(program, arguments, "exec \"$0\" \"$@\" 1>&2"), environment(socket)) {}
+                    const std::string& program = KELVOCTL_PROGRAM, const std::string& display = {})
+        : ChildProcess(command(program, arguments, "exec \"$0\" \"$@\" 1>&2"), environment(socket, display)) {
+    }
 
     /// The exit status of a command that ends by itself, and what it printed on both outputs.
     static std::pair<int, std::string> run(const std::string& socket,
@@ -26,7 +28,7 @@ class KelvoctlProcess : public ChildProcess {
     static std::string answer(const std::string& socket, const std::vector<std::string>& arguments) {
         ChildProcess process(
             command(KELVOCTL_PROGRAM, arguments, "exec 3>&2 2>/dev/null; exec \"$0\" \"$@\" 1>&3"),
-            environment(socket));
+            environment(socket, {}));
         process.waitForExit();
         return process.output();
     }
@@ -39,8 +41,9 @@ class KelvoctlProcess : public ChildProcess {
         all.insert(all.end(), arguments.begin(), arguments.end());
         return all;
     }
-    static std::map<std::string, std::string> environment(const std::string& socket) {
-        return {{"KELVO_SOCKET", socket}, {"DISPLAY", ""}};
+    static std::map<std::string, std::string> environment(const std::string& socket,
+                                                          const std::string& display) {
+        return {{"KELVO_SOCKET", socket}, {"DISPLAY", display}};
     }
 };
 

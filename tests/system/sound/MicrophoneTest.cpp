@@ -16,10 +16,8 @@ TEST_F(MicrophoneTest, TrackHoldsWhatTheMicrophoneHears) {
     const auto application = server.play(1000, "speaker");
     startMicrophone();
     ASSERT_TRUE(hears(microphone, 440));
-    microphone.next(1);  // what the server says first of its latency is some milliseconds off
+    EXPECT_TRUE(hearsOnly(microphone, 440, 1000));
     const auto heard = microphone.next(1);
-    EXPECT_NEAR(amplitudeIn(heard, 440), kPlayed, kPlayed / 20);
-    EXPECT_LT(test::ratioInDecibels(amplitudeIn(heard, 1000), amplitudeIn(heard, 440)), -60);
     EXPECT_LT(test::worstSeam(heard), 0.002);
     const double now = std::chrono::duration<double>(platform.clock->monotonicNow()).count();
     EXPECT_NEAR(heard.back()->presentationTime().seconds(), now, 0.5);

@@ -118,6 +118,20 @@ class SoundFixture : public testing::Test {
         return false;
     }
 
+    /// Waits for a second of `track` that holds `frequency` as it was played, and `other` at least 60 dB
+    /// lower. A busy machine makes a player stutter, which spoils the second that it happens in; another's
+    /// tone would spoil them all.
+    static bool hearsOnly(Track& track, double frequency, double other) {
+        for (int attempt = 0; attempt < 15; ++attempt) {
+            const auto heard = track.next(1);
+            const double wanted = amplitudeIn(heard, frequency);
+            if (std::abs(wanted - kPlayed) < kPlayed / 20 &&
+                ratioInDecibels(amplitudeIn(heard, other), wanted) < -60)
+                return true;
+        }
+        return false;
+    }
+
     LogRecorder log;
     SoundServer server;
     Platform platform = soundPlatform();

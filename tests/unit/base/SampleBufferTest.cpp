@@ -53,6 +53,14 @@ TEST(SampleBufferTest, TimesAreThoseOfTheFirstRecord) {
     EXPECT_EQ(sample->timing().front(), kTiming);
 }
 
+TEST(SampleBufferTest, CaptureTimeIsTheFirstPresentationTimeAndStaysInCopies) {
+    const auto sample = someAudio();
+    EXPECT_EQ(sample->captureTime(), kTiming.presentationTime);
+    const auto copy = sample->copyWithTiming(std::span(&kOtherTiming, 1));
+    EXPECT_EQ(copy->presentationTime(), kOtherTiming.presentationTime);
+    EXPECT_EQ(copy->captureTime(), kTiming.presentationTime);
+}
+
 TEST(SampleBufferTest, CopySharesTheContentAndHasTimesOfItsOwn) {
     const auto sample = someAudio();
     const TimingRecord records[] = {kOtherTiming, kTiming};

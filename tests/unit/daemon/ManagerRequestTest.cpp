@@ -242,5 +242,37 @@ TEST_F(ManagerRequestTest, NobodyBroadcastsWithAnExtensionWhileNoneIsLinked) {
     EXPECT_THAT(answers, ElementsAre(false));
 }
 
+TEST_F(ManagerRequestTest, OnlyWhatLiesInTheStoreIsSavedAndDeleted) {
+    device.fileSystem->addFile("/etc/passwd", 1);
+    std::vector<std::int64_t> codes;
+    for (const char* path : {"/etc/passwd", "/private/var/mobile/Library/KelvoKit/../../passwd"}) {
+        manager->saveVideoToCameraRoll(URL::file(path),
+                                       [&](const OptionalError& e) { codes.push_back(e->code()); });
+    }
+    manager->saveVideoToCameraRoll(URL::file("/etc/passwd"), nullptr);
+    device.settle();
+    EXPECT_THAT(codes, ElementsAre(-5812, -5812));
+    EXPECT_TRUE(device.fileSystem->itemExists("/etc/passwd"));
+    EXPECT_THAT(device.photoLibrary->items(), IsEmpty());
+    EXPECT_THAT(device.alerts->shownAlerts(), IsEmpty()) << "the user has nothing to do with it";
+}
+
+TEST_F(ManagerRequestTest, DiscardOfACallerWithoutASessionIsAnswered) {
+    int answers = 0;
+    manager->discardRecordingWithHandler([&] { ++answers; });
+    manager->discardRecordingWithHandler(nullptr);
+    EXPECT_EQ(answers, 1);
+}
+
+TEST_F(ManagerRequestTest, BroadcastThatIsResumedAsksFirst) {
+    const auto found = recordingSession("com.example.app");
+    found->broadcasting = true;
+    found->paused = true;
+    device.renderServer->setProcessOfContext(7, 10);
+    manager->resumeRecordingWithWindowLayerContextID(7);
+    EXPECT_TRUE(log.contains("KVRecordingManager: showResumeBroadcastAlertWithSession is not offered yet"));
+    EXPECT_THAT(found->requests, ElementsAre("resumeSession"));
+}
+
 }  // namespace
 }  // namespace kelvo

@@ -23,14 +23,16 @@ TEST(OptionsTest, WithoutArgumentsItRunsOnTheRootAndLogsToTheJournal) {
     EXPECT_EQ(options->root, "/");
     EXPECT_EQ(options->log, Options::Log::journal);
     EXPECT_EQ(options->resourceFolder, "");
+    EXPECT_FALSE(options->savesToUsersVideos);
 }
 
 TEST(OptionsTest, ValuesStandBehindTheOptionOrItsEqualsSign) {
-    const auto options = parse({"--root", "/d", "--log=stderr", "--resources", "/r"});
+    const auto options = parse({"--root", "/d", "--log=stderr", "--user-videos", "--resources", "/r"});
     ASSERT_TRUE(options);
     EXPECT_EQ(options->root, "/d");
     EXPECT_EQ(options->log, Options::Log::standardError);
     EXPECT_EQ(options->resourceFolder, "/r");
+    EXPECT_TRUE(options->savesToUsersVideos);
 }
 
 TEST(OptionsTest, HelpAndVersionAreActions) {
@@ -48,6 +50,7 @@ TEST(OptionsTest, WhatIsWrongIsNamed) {
     EXPECT_EQ(problemWith({"--root="}), "--root needs a folder");
     EXPECT_EQ(problemWith({"--log", "paper"}), "--log needs \"journal\" or \"stderr\"");
     EXPECT_EQ(problemWith({"--log"}), "--log needs \"journal\" or \"stderr\"");
+    EXPECT_EQ(problemWith({"--user-videos=x"}), "--user-videos takes no value");
     EXPECT_EQ(problemWith({"--help=x"}), "--help takes no value");
 }
 

@@ -313,5 +313,16 @@ TEST_F(KVClientProxyFactoryTest, OtherClientsGetAProxyOfTheirOwn) {
     }
 }
 
+TEST_F(KVClientProxyTest, MovieIsGivenWhereTheClientFindsIt) {
+    const Client client = connect(10);
+    std::static_pointer_cast<SimulatedConnection>(accepted.front())->peerSuffix = "?peer";
+    KVClientProxy(accepted.front()).recordingDidStopWithError(std::nullopt, URL("file:///m"));
+    KVMultipleClientProxy all;
+    all.handleNewConnection(accepted.front());
+    device.settle();
+    ASSERT_EQ(client.callbacks->stops.copy().size(), 1U);
+    EXPECT_EQ(client.callbacks->stops.copy().front().movieURL, URL("file:///m?peer"));
+}
+
 }  // namespace
 }  // namespace kelvo

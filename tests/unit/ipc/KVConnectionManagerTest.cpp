@@ -264,5 +264,20 @@ TEST(DaemonInterface, OnlyTheEndpointArgumentCarriesObjects) {
     }
 }
 
+TEST_F(KVConnectionManagerTest, MoviesAreGivenWhereTheClientFindsThemAndTakenBackSo) {
+    daemon->keepsStopHandler = true;
+    const Client client = connect(20);
+    Guarded<std::vector<std::optional<URL>>> movies;
+    client.daemon->stopRecordingWithHandler(
+        [&](const auto& movieURL, const auto&) { movies.with([&](auto& all) { all.push_back(movieURL); }); });
+    device.settle();
+    std::static_pointer_cast<SimulatedConnection>(manager->getCurrentConnection())->peerSuffix = "?peer";
+    daemon->keptStopHandler.exchange(nullptr)(URL("file:///m"), std::nullopt);
+    client.daemon->saveVideoToCameraRoll(URL("file:///m?peer"), nullptr);
+    device.settle();
+    EXPECT_THAT(movies.copy(), ElementsAre(URL("file:///m?peer")));
+    EXPECT_EQ(daemon->arguments().back(), Array{URL("file:///m")});
+}
+
 }  // namespace
 }  // namespace kelvo

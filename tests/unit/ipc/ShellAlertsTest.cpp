@@ -210,5 +210,13 @@ TEST(AlertProtocolsTest, SignaturesOnTheWire) {
     EXPECT_EQ(signatureOf(shell[1]), "x");
 }
 
+TEST_F(ShellAlertsTest, ClosedServiceTakesItsAlertsAwayAndShowsNone) {
+    const Shell shell = connect(10);
+    const auto alert = *alerts->createAlert(kContent);
+    alerts->close();
+    EXPECT_EQ(alert->waitForResponse(), SystemAlertResponse::cancelled);
+    EXPECT_EQ(alerts->createAlert(kContent).error().code(), ENOTCONN);
+}
+
 }  // namespace
 }  // namespace kelvo

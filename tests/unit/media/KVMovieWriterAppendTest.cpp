@@ -62,6 +62,25 @@ TEST_F(KVMovieWriterAppendTest, VideoSamplesAreAppendedInOrder) {
     EXPECT_EQ(log.count(LogLevel::info, "appending video sample"), 2U);
 }
 
+TEST_F(KVMovieWriterAppendTest, EveryFrameTellsWhenItWasCapturedAndWhenItIsPresented) {
+    start();
+    const auto append = [&](std::int64_t captured, std::int64_t presented) {
+        const TimingRecord rebased = timingAt(presented);
+        writer->appendVideoSampleBuffer(videoSample(captured)->copyWithTiming(std::span(&rebased, 1)), {});
+    };
+    append(150, 100);
+    append(250, 200);
+    append(900, 200);  // the first one after a pause, which is discarded
+    EXPECT_EQ(log.count(kVideoDiscard), 1U);
+    const auto stretches = fileWriter()->timeline().stretches();
+    ASSERT_EQ(stretches.size(), 2U);
+    EXPECT_EQ(stretches[0].firstFrame.value, 150);
+    EXPECT_EQ(stretches[0].lastFrame.value, 250);
+    EXPECT_EQ(stretches[0].shift.value, 50);
+    EXPECT_EQ(stretches[1].firstFrame.value, 900);
+    EXPECT_EQ(stretches[1].shift.value, 700);
+}
+
 TEST_F(KVMovieWriterAppendTest, SamplesAreHeldBackWhileTheInputIsBusy) {
     startMovie();
     video()->setBusy(true);

@@ -47,6 +47,15 @@ TEST_F(KVSessionManagerStopTest, RecordingWithoutAHandlerIsThrownAway) {
     EXPECT_THAT(delegate->saveCompletions, IsEmpty());
 }
 
+TEST_F(KVSessionManagerStopTest, RecordingThatTheHandlerStartsIsNotReset) {
+    const auto session = recording(kApp);
+    manager.stopRecordingSession(session, 0, 0, [&](const auto&, const auto&) { session->recording = true; });
+    diary.clear();
+    session->completeFinish(kMovie, std::nullopt);
+    EXPECT_THAT(diary, ElementsAre(kApp + "'s client: updateScreenRecordingState"));
+    EXPECT_TRUE(session->recording);
+}
+
 TEST_F(KVSessionManagerStopTest, BroadcastWithoutAHandlerIsFinished) {
     const auto session = recording(kApp);
     session->broadcasting = true;

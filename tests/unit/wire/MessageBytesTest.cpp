@@ -126,8 +126,8 @@ class MessageBytesTest : public testing::Test {
 
     /// A connection as a client has it, with its greeting read.
     std::shared_ptr<SocketConnection> clientAt(UniqueFd socket) {
-        auto client =
-            std::make_shared<SocketConnection>(Side::client, std::move(socket), loop, nullptr, nullptr);
+        auto client = std::make_shared<SocketConnection>(Side::client, std::move(socket), loop, nullptr,
+                                                         nullptr, nullptr);
         client->setRemoteInterface(interfaceOf<KVDaemonProtocol>());
         client->setExported(interfaceOf<KVClientProtocol>(),
                             std::make_shared<ProtocolDispatcher<KVClientProtocol>>(callbacks));
@@ -136,8 +136,8 @@ class MessageBytesTest : public testing::Test {
     }
     /// A connection as the daemon has it, with its answers to a client's greeting read.
     std::shared_ptr<SocketConnection> serverAt(RawSocket& end, UniqueFd socket) {
-        auto server =
-            std::make_shared<SocketConnection>(Side::server, std::move(socket), loop, nullptr, nullptr);
+        auto server = std::make_shared<SocketConnection>(Side::server, std::move(socket), loop, nullptr,
+                                                         nullptr, nullptr);
         server->setRemoteInterface(interfaceOf<KVClientProtocol>());
         server->setExported(interfaceOf<KVDaemonProtocol>(),
                             std::make_shared<ProtocolDispatcher<KVDaemonProtocol>>(daemon));

@@ -39,6 +39,7 @@ class InvisibleBulletins : public BulletinService {
     class Proxy : public BulletinProxy {
       public:
         void withdrawAllBulletins() override {}
+        void postBulletin(const BulletinRequest&, bool) override {}
     };
     class Connection : public BulletinConnection {
       public:

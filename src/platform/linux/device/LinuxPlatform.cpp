@@ -25,7 +25,8 @@
 
 namespace kelvo {
 
-Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root, const std::string& storePath) {
+Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root, const std::string& storePath,
+                       bool savesToUsersVideos) {
     Platform platform;
     platform.processIdentifier = ::getpid();
     platform.clock = std::make_shared<SystemClock>();
@@ -52,8 +53,8 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root, const std:
     platform.media =
         std::make_shared<LoadedMediaService>(platform.fileSystem, LoadedMediaService::usualFolders());
     platform.ipc = std::make_shared<SocketTransport>(root, platform.bundles);
-    platform.photoLibrary =
-        std::make_shared<LinuxPhotoLibrary>(root, screenRecordingsFolder(*root), platform.random);
+    platform.photoLibrary = std::make_shared<LinuxPhotoLibrary>(
+        root, screenRecordingsFolder(*root, savesToUsersVideos), platform.random);
     platform.sounds = std::make_shared<SilentSystemSounds>();
     platform.applications = std::make_shared<x11::X11Applications>("", platform.bundles);
     platform.accessibility = std::make_shared<UnreadScreen>();

@@ -22,8 +22,8 @@ enum Field : std::uint8_t {
 };
 
 constexpr std::size_t kLongestName = 255;
-/// What a header of ours and a small body take.
-constexpr std::size_t kUsualHeader = 320;
+/// What most messages' headers fit into; a larger one grows.
+constexpr std::size_t kUsualHeader = 384;
 
 KVError malformed(const char* what) {
     return KVError::posix(EBADMSG, what);
@@ -129,7 +129,7 @@ class HeaderWriter {
     explicit HeaderWriter(const Message& message) : message_(message) {}
 
     Bytes write() {
-        out_.reserve(kUsualHeader);
+        out_.reserve(kUsualHeader + message_.body.size());
         const std::array<std::uint8_t, 4> head{'l', static_cast<std::uint8_t>(message_.type), message_.flags,
                                                1};
         append(head.data(), head.size());

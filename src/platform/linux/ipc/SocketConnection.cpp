@@ -16,12 +16,14 @@ namespace kelvo {
 using namespace ipc_bounds;
 
 SocketConnection::SocketConnection(Side side, UniqueFd socket, std::shared_ptr<SocketLoop> loop,
-                                   std::shared_ptr<BundleService> bundles, Task release)
+                                   std::shared_ptr<BundleService> bundles,
+                                   std::shared_ptr<const DeviceRoot> root, Task release)
     : ConnectionBase("com.quillon.kelvod.connection"),
       side_(side),
       socket_(std::make_shared<UniqueFd>(std::move(socket))),
       loop_(std::move(loop)),
       peer_(socket_.copy()->get(), std::move(bundles)),
+      root_(std::move(root)),
       release_(std::move(release)) {
     if (side_ == Side::server) {
         authentication_.emplace(peer_.user());
@@ -31,6 +33,14 @@ SocketConnection::SocketConnection(Side side, UniqueFd socket, std::shared_ptr<S
     const auto* first = reinterpret_cast<const std::byte*>(greeting.data());
     out_.queue.push_back({Bytes(first, first + greeting.size()), 0, {}});
     out_.unsentBytes = greeting.size();
+}
+
+URL SocketConnection::urlForPeer(const URL& url) const {
+    return url.isFileURL() ? URL::file(root_->hostPath(url.path())) : url;
+}
+
+URL SocketConnection::urlFromPeer(const URL& url) const {
+    return url.isFileURL() ? URL::file(root_->devicePath(url.path())) : url;
 }
 
 SocketConnection::~SocketConnection() {

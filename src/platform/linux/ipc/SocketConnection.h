@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/ConnectionBase.h"
+#include "platform/linux/files/DeviceRoot.h"
 #include "platform/linux/ipc/Authentication.h"
 #include "platform/linux/ipc/DBusMessage.h"
 #include "platform/linux/ipc/Peer.h"
@@ -24,11 +25,15 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
 
     /// `release` runs once, when the connection has ended.
     SocketConnection(Side side, UniqueFd socket, std::shared_ptr<SocketLoop> loop,
-                     std::shared_ptr<BundleService> bundles, Task release);
+                     std::shared_ptr<BundleService> bundles, std::shared_ptr<const DeviceRoot> root,
+                     Task release);
     ~SocketConnection() override;
 
     std::int32_t processIdentifier() const override { return peer_.processIdentifier(); }
     Value valueForEntitlement(std::string_view name) const override { return peer_.entitlement(name); }
+
+    URL urlForPeer(const URL& url) const override;
+    URL urlFromPeer(const URL& url) const override;
 
     void ready(std::uint32_t events) override;
     std::optional<Moment> tick(Moment now) override;
@@ -40,6 +45,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     void didServe() override;
     bool runSoon(Task& task) override;
     void close() override;
+    void didEnd() override { peer_.forget(); }
 
   private:
     /// A message on its way out: what is left of its bytes, and its descriptors until the first byte is gone.
@@ -96,7 +102,8 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     const Side side_;
     Guarded<Socket> socket_;
     const std::shared_ptr<SocketLoop> loop_;
-    const Peer peer_;
+    Peer peer_;
+    const std::shared_ptr<const DeviceRoot> root_;
     Guarded<Task> release_;
     std::atomic<SocketLoop::Token> token_{0};
 

@@ -56,8 +56,9 @@ UniqueFd openNothing() {
 /// What the loop holds; the listener may go while it accepts.
 class SocketListener::Door : public SocketWatcher, public std::enable_shared_from_this<Door> {
   public:
-    Door(std::shared_ptr<SocketLoop> loop, std::shared_ptr<BundleService> bundles, bool isNamed)
-        : loop_(std::move(loop)), bundles_(std::move(bundles)), isNamed_(isNamed) {}
+    Door(std::shared_ptr<SocketLoop> loop, std::shared_ptr<BundleService> bundles,
+         std::shared_ptr<const DeviceRoot> root, bool isNamed)
+        : loop_(std::move(loop)), bundles_(std::move(bundles)), root_(std::move(root)), isNamed_(isNamed) {}
 
     void setListener(SocketListener* listener) {
         const std::lock_guard lock(mutex_);
@@ -129,7 +130,7 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
             return;
         }
         const auto connection = std::make_shared<SocketConnection>(
-            SocketConnection::Side::server, std::move(socket), loop_, bundles_,
+            SocketConnection::Side::server, std::move(socket), loop_, bundles_, root_,
             [all = open_, processIdentifier] {
                 all->with([&](OpenConnections& each) { each.leave(processIdentifier); });
             });
@@ -142,6 +143,7 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
 
     const std::shared_ptr<SocketLoop> loop_;
     const std::shared_ptr<BundleService> bundles_;
+    const std::shared_ptr<const DeviceRoot> root_;
     const bool isNamed_;
     const std::shared_ptr<Guarded<OpenConnections>> open_ = std::make_shared<Guarded<OpenConnections>>();
     std::recursive_mutex mutex_;  // a listener stays while its delegate decides, and the delegate may drop it
@@ -164,17 +166,19 @@ SocketListener::~SocketListener() {
 }
 
 std::shared_ptr<SocketListener> SocketListener::named(std::string path, std::shared_ptr<SocketLoop> loop,
-                                                      std::shared_ptr<BundleService> bundles) {
-    auto door = std::make_shared<Door>(std::move(loop), std::move(bundles), true);
+                                                      std::shared_ptr<BundleService> bundles,
+                                                      std::shared_ptr<const DeviceRoot> root) {
+    auto door = std::make_shared<Door>(std::move(loop), std::move(bundles), std::move(root), true);
     return std::shared_ptr<SocketListener>(new SocketListener(std::move(path), nullptr, std::move(door)));
 }
 
 Result<std::shared_ptr<IPCListener>> SocketListener::anonymous(std::shared_ptr<SocketLoop> loop,
-                                                               std::shared_ptr<BundleService> bundles) {
+                                                               std::shared_ptr<BundleService> bundles,
+                                                               std::shared_ptr<const DeviceRoot> root) {
     std::array<int, 2> ends{-1, -1};
     if (::socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends.data()) != 0)
         return KVError::posix(errno, "anonymous listener");
-    auto door = std::make_shared<Door>(std::move(loop), std::move(bundles), false);
+    auto door = std::make_shared<Door>(std::move(loop), std::move(bundles), std::move(root), false);
     door->setSocket(UniqueFd(ends[0]));
     auto endpoint = std::make_shared<SocketEndpoint>(UniqueFd(ends[1]));
     return std::shared_ptr<IPCListener>(new SocketListener("", std::move(endpoint), std::move(door)));

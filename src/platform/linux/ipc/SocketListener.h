@@ -3,6 +3,7 @@
 #include "base/Guarded.h"
 #include "platform/Bundles.h"
 #include "platform/IPC.h"
+#include "platform/linux/files/DeviceRoot.h"
 #include "platform/linux/ipc/SocketEndpoint.h"
 #include "platform/linux/ipc/SocketLoop.h"
 
@@ -18,9 +19,11 @@ class SocketListener : public IPCListener {
     /// Listens on the socket of that name which the service manager has handed over, if it did. Else at
     /// `path`, whose folder is made; a socket that an earlier process left there is replaced.
     static std::shared_ptr<SocketListener> named(std::string path, std::shared_ptr<SocketLoop> loop,
-                                                 std::shared_ptr<BundleService> bundles);
+                                                 std::shared_ptr<BundleService> bundles,
+                                                 std::shared_ptr<const DeviceRoot> root);
     static Result<std::shared_ptr<IPCListener>> anonymous(std::shared_ptr<SocketLoop> loop,
-                                                          std::shared_ptr<BundleService> bundles);
+                                                          std::shared_ptr<BundleService> bundles,
+                                                          std::shared_ptr<const DeviceRoot> root);
     ~SocketListener() override;
 
     void setDelegate(std::weak_ptr<IPCListenerDelegate> delegate) override;

@@ -15,11 +15,11 @@ std::string SocketTransport::pathOf(std::string_view serviceName) const {
 }
 
 std::shared_ptr<IPCListener> SocketTransport::createListener(std::string_view serviceName) {
-    return SocketListener::named(pathOf(serviceName), loop_, bundles_);
+    return SocketListener::named(pathOf(serviceName), loop_, bundles_, root_);
 }
 
 Result<std::shared_ptr<IPCListener>> SocketTransport::createAnonymousListener() {
-    return SocketListener::anonymous(loop_, bundles_);
+    return SocketListener::anonymous(loop_, bundles_, root_);
 }
 
 Result<IPCConnectionRef> SocketTransport::connectToService(std::string_view serviceName) {
@@ -34,8 +34,8 @@ Result<IPCConnectionRef> SocketTransport::connectToSocket(const std::string& hos
     UniqueFd socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
     if (!socket || ::connect(socket.get(), reinterpret_cast<sockaddr*>(&address), sizeof(address)) != 0)
         return KVError::posix(errno, hostPath);
-    return IPCConnectionRef(std::make_shared<SocketConnection>(SocketConnection::Side::client,
-                                                               std::move(socket), loop_, bundles_, nullptr));
+    return IPCConnectionRef(std::make_shared<SocketConnection>(
+        SocketConnection::Side::client, std::move(socket), loop_, bundles_, root_, nullptr));
 }
 
 Result<IPCConnectionRef> SocketTransport::connectToEndpoint(const std::shared_ptr<IPCEndpoint>& endpoint) {
@@ -48,7 +48,7 @@ Result<IPCConnectionRef> SocketTransport::connectToEndpoint(const std::shared_pt
     const UniqueFd sent(ends[1]);
     if (const OptionalError error = way->sendConnection(sent.get())) return *error;
     return IPCConnectionRef(std::make_shared<SocketConnection>(SocketConnection::Side::client, std::move(own),
-                                                               loop_, bundles_, nullptr));
+                                                               loop_, bundles_, root_, nullptr));
 }
 
 IPCConnectionRef SocketTransport::currentConnection() {

@@ -32,13 +32,22 @@ std::optional<PhotoAsset> LinuxPhotoLibrary::assetWithLocalIdentifier(std::strin
     return isThere ? std::optional(PhotoAsset{std::string(localIdentifier)}) : std::nullopt;
 }
 
+Result<std::vector<PhotoAssetDetails>> LinuxPhotoLibrary::assets() {
+    const auto movies = movies_.movies();
+    if (!movies) return movies.error();
+    std::vector<PhotoAssetDetails> assets;
+    for (const LibraryMovie& movie : *movies)
+        assets.push_back({{movie.identifier}, movie.path, movie.creationDate, movie.size});
+    return assets;
+}
+
 OptionalError LinuxPhotoLibrary::deleteAsset(const PhotoAsset& asset) {
     return movies_.remove(asset.localIdentifier);
 }
 
-std::string screenRecordingsFolder(const DeviceRoot& root) {
-    const std::string videos =
-        root.root().empty() ? videosFolder(UserEnvironment::ofProcess()) : root.hostPath(kVideosOfRoot);
+std::string screenRecordingsFolder(const DeviceRoot& root, bool isUsersOwn) {
+    const std::string videos = isUsersOwn || root.root().empty() ? videosFolder(UserEnvironment::ofProcess())
+                                                                 : root.hostPath(kVideosOfRoot);
     return videos + std::string(kFolderName);
 }
 

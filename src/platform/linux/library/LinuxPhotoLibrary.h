@@ -18,6 +18,7 @@ class LinuxPhotoLibrary : public PhotoLibrary {
 
     Result<PhotoAsset> createVideoAsset(const URL& movieURL) override;
     std::optional<PhotoAsset> assetWithLocalIdentifier(std::string_view localIdentifier) override;
+    Result<std::vector<PhotoAssetDetails>> assets() override;
     OptionalError deleteAsset(const PhotoAsset& asset) override;
 
   private:
@@ -26,7 +27,7 @@ class LinuxPhotoLibrary : public PhotoLibrary {
 };
 
 /// Where the recordings are, on the host: "Screen Recordings" in the user's videos folder, or in the videos
-/// folder of a device root of one's own.
-std::string screenRecordingsFolder(const DeviceRoot& root);
+/// folder of a device root of one's own unless `isUsersOwn`.
+std::string screenRecordingsFolder(const DeviceRoot& root, bool isUsersOwn = false);
 
 }  // namespace kelvo

@@ -8,9 +8,9 @@ namespace kelvo {
 namespace {
 
 constexpr double kLongestGap = 24 * 60 * 60;  // seconds
-/// A difference as large as this is a gap or an overlap, not a clock; in seconds. Below the 20 ms that
+/// A difference as large as this is a gap or an overlap, not a clock; in seconds. Below the 15 ms that
 /// picture and sound may be apart.
-constexpr double kGap = 0.018;
+constexpr double kGap = 0.012;
 /// Smaller differences are left alone, so that the resampler mostly runs at its plain rate; in seconds.
 constexpr double kTolerance = 0.001;
 constexpr double kSmoothing = 0.1;         // the weight of one block's difference
@@ -22,14 +22,15 @@ constexpr std::size_t kTail = 128;
 
 AudioAligner::AudioAligner(int sampleRate, AlignedAudioSink& sink) : sampleRate_(sampleRate), sink_(sink) {}
 
-OptionalError AudioAligner::add(PcmBlock block, double seconds) {
+OptionalError AudioAligner::add(PcmBlock block, double seconds, Joint joint) {
     const double wanted = seconds * sampleRate_;
     if (!(std::abs(seconds) <= kLongestGap) || block.sampleCount() == 0) return std::nullopt;
     if (OptionalError error = prepareResampler(block)) return error;
     if (!position_) return beginAt(block, wanted);
     if (wanted - inputPosition() > kLongestGap * sampleRate_) return std::nullopt;
+    if (joint == Joint::exact) stopFollowing();
     const double difference = wanted - inputPosition();
-    const double gap = kGap * sampleRate_;
+    const double gap = joint == Joint::exact ? 0.5 : kGap * sampleRate_;
     if (difference <= -gap || (isCutting_ && difference < 0)) {
         cut(block, -difference);
         return resample(block);
@@ -49,7 +50,7 @@ void AudioAligner::cut(PcmBlock& block, double count) {
     const auto cutSamples = static_cast<std::size_t>(std::llround(count * inputRate_ / sampleRate_));
     isCutting_ = cutSamples >= block.sampleCount();
     block.dropFirst(cutSamples);
-    smoothedDifference_ = 0;
+    stopFollowing();
 }
 
 OptionalError AudioAligner::beginAt(PcmBlock& block, double position) {
@@ -98,11 +99,12 @@ double AudioAligner::inputPosition() const {
 }
 
 OptionalError AudioAligner::fillGap(std::int64_t count) {
-    smoothedDifference_ = 0;
-    static_cast<void>(swr_set_compensation(resampler_.get(), 0, 0));
+    stopFollowing();
     const double end = inputPosition() + static_cast<double>(count);
-    if (OptionalError error = resampleSilence(kTail)) return error;
-    // The resampler now remembers only silence, so more of it need not go through it.
+    const double gapInput = static_cast<double>(count) * inputRate_ / sampleRate_;
+    if (OptionalError error = resampleSilence(std::min(kTail, static_cast<std::size_t>(gapInput))))
+        return error;
+    // After more than that the resampler now remembers only silence, so more of it need not go through it.
     const std::int64_t left = std::llround(end - inputPosition());
     if (left <= 0) return std::nullopt;
     *position_ += left;
@@ -116,6 +118,11 @@ void AudioAligner::follow(double difference) {
     const double most = kMostStretching * sampleRate_;
     const int samples = static_cast<int>(std::lround(std::clamp(smoothedDifference_, -most, most)));
     static_cast<void>(swr_set_compensation(resampler_.get(), samples, sampleRate_));
+}
+
+void AudioAligner::stopFollowing() {
+    smoothedDifference_ = 0;
+    static_cast<void>(swr_set_compensation(resampler_.get(), 0, 0));
 }
 
 OptionalError AudioAligner::resampleSilence(std::size_t count) {

@@ -22,16 +22,22 @@ class AlignedAudioSink {
     virtual OptionalError silence(std::int64_t count) = 0;
 };
 
-/// Brings the sound of one track to the movie's clock: stereo of one sample rate, each sample within 18 ms of
+/// Brings the sound of one track to the movie's clock: stereo of one sample rate, each sample within 12 ms of
 /// its time for any length. Small differences (two clocks that do not run alike) are absorbed by resampling a
 /// little faster or slower; a gap becomes silence and an overlap is cut. Caller's thread.
 class AudioAligner {
   public:
+    /// How a block joins the sound before it.
+    enum class Joint {
+        smooth,  ///< small differences are absorbed
+        exact    ///< it begins at its time, to the sample
+    };
+
     AudioAligner(int sampleRate, AlignedAudioSink& sink);
 
     /// Adds a block that begins `seconds` after the timeline's beginning; what lies before the beginning is
     /// cut. A block more than a day ahead is dropped.
-    OptionalError add(PcmBlock block, double seconds);
+    OptionalError add(PcmBlock block, double seconds, Joint joint = Joint::smooth);
 
     /// Hands over what is still in the resampler. Nothing is added any more.
     OptionalError flush();
@@ -42,6 +48,7 @@ class AudioAligner {
     OptionalError fillGap(std::int64_t count);
     void cut(PcmBlock& block, double count);
     void follow(double difference);
+    void stopFollowing();
     OptionalError resample(const PcmBlock& block);
     OptionalError resampleSilence(std::size_t count);
     /// Where the next sample put in comes out.

@@ -42,8 +42,8 @@ OptionalError LavFileWriter::openMovie() {
 }
 
 void LavFileWriter::startSession(const MediaTime& sourceTime) {
-    if (status() != Status::writing || session_->start.copy().isValid()) return;
-    session_->start.set(sourceTime);
+    if (status() != Status::writing || session_->timeline.start().isValid()) return;
+    session_->timeline.begin(sourceTime);
     session_->takesSamples = sourceTime.isValid();
 }
 
@@ -58,7 +58,7 @@ void LavFileWriter::finishWriting(std::function<void()> completion) {
 void LavFileWriter::finish() {
     for (const auto& input : inputs_.copy())
         input->flush();
-    const MediaTime end = end_.copy() - session_->start.copy();
+    const MediaTime end = end_.copy() - session_->timeline.start();
     if (const OptionalError error = session_->muxer->finish(end)) session_->fail(*error);
     auto expected = Status::writing;
     session_->status.compare_exchange_strong(expected, Status::completed);

@@ -24,6 +24,9 @@ class LavFileWriter : public MediaFileWriter, public std::enable_shared_from_thi
     std::optional<URL> outputURL() const override { return url_; }
     bool startWriting() override;
     void startSession(const MediaTime& sourceTime) override;
+    void relateTimes(const MediaTime& captureTime, const MediaTime& sourceTime) override {
+        session_->timeline.relate(captureTime, sourceTime);
+    }
     void endSession(const MediaTime& sourceTime) override { end_.set(sourceTime); }
     void finishWriting(std::function<void()> completion) override;
 

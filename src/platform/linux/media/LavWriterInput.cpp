@@ -83,15 +83,15 @@ bool LavWriterInput::isEncoding() const {
 void LavWriterInput::encode(const SampleBuffer& sample) {
     if (!isEncoding()) return;
     const auto session = session_.copy();
-    if (const OptionalError error = encoder_->encode(sample, session->start.copy())) session->fail(*error);
+    if (const OptionalError error = encoder_->encode(sample, session->timeline)) session->fail(*error);
 }
 
 void LavWriterInput::flush() {
     queue_.sync([this] {
         if (!isEncoding()) return;
         isFlushed_ = true;
-        const OptionalError error = encoder_->flush();
-        if (error) session_.copy()->fail(*error);
+        const auto session = session_.copy();
+        if (const OptionalError error = encoder_->flush(session->timeline)) session->fail(*error);
     });
 }
 

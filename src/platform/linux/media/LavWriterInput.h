@@ -17,7 +17,7 @@ struct WriterSession {
     std::atomic<bool> takesSamples{false};  ///< the session has begun and does not finish yet
     std::atomic<bool> isAbandoned{false};   ///< nobody wants what is still queued
     Guarded<OptionalError> error;
-    Guarded<MediaTime> start;
+    MovieTimeline timeline;
     /// Set once, before the session begins.
     std::unique_ptr<MovieMuxer> muxer;
 

@@ -81,6 +81,15 @@ void PcmBlock::dropFirst(std::size_t count) {
     }
 }
 
+PcmBlock PcmBlock::part(std::size_t first, std::size_t count) const {
+    PcmBlock part{sampleRate, {}};
+    for (const auto& channel : channels) {
+        const auto begin = channel.begin() + static_cast<std::ptrdiff_t>(first);
+        part.channels.emplace_back(begin, begin + static_cast<std::ptrdiff_t>(count));
+    }
+    return part;
+}
+
 Result<PcmBlock> readPcm(const SampleBuffer& sample) {
     const auto layout = layoutOf(sample.audioFormat());
     if (!layout) return mediaError(kMediaErrorUnsupportedFormat, "not a linear PCM format");

@@ -17,6 +17,8 @@ struct PcmBlock {
     std::size_t sampleCount() const { return channels.empty() ? 0 : channels.front().size(); }
     /// Drops the first `count` samples of every channel.
     void dropFirst(std::size_t count);
+    /// `count` samples of every channel from number `first` on; the block has that many.
+    PcmBlock part(std::size_t first, std::size_t count) const;
 };
 
 /// The sound of `sample`: linear PCM of 1 to 8 channels and 8000 to 192000 Hz; integers of 8 to 32 bits or

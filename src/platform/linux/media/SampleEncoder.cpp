@@ -4,6 +4,7 @@
 #include "platform/linux/media/AudioAligner.h"
 #include "platform/linux/media/AudioEncoder.h"
 #include "platform/linux/media/FrameConverter.h"
+#include "platform/linux/media/SoundCutter.h"
 #include "platform/linux/media/VideoEncoder.h"
 
 #include <cerrno>
@@ -15,8 +16,8 @@ namespace {
 class VideoSampleEncoder : public SampleEncoder {
   public:
     Result<TrackFormat> open(const Dictionary& outputSettings, SampleHandler handler) override;
-    OptionalError encode(const SampleBuffer& sample, const MediaTime& start) override;
-    OptionalError flush() override { return encoder_->flush(handler_); }
+    OptionalError encode(const SampleBuffer& sample, const MovieTimeline& timeline) override;
+    OptionalError flush(const MovieTimeline&) override { return encoder_->flush(handler_); }
 
   private:
     SampleHandler handler_;
@@ -42,8 +43,9 @@ Result<TrackFormat> VideoSampleEncoder::open(const Dictionary& outputSettings, S
     return format;
 }
 
-OptionalError VideoSampleEncoder::encode(const SampleBuffer& sample, const MediaTime& start) {
-    const MediaTime time = (sample.presentationTime() - start).convertedTo(VideoEncoder::kTimescale);
+OptionalError VideoSampleEncoder::encode(const SampleBuffer& sample, const MovieTimeline& timeline) {
+    const MediaTime time =
+        (sample.presentationTime() - timeline.start()).convertedTo(VideoEncoder::kTimescale);
     // Frames closer than the file's unit fall on one time; so does a clock that stands still.
     if (!time.isValid() || time.value <= lastTime_) return std::nullopt;
     lastTime_ = time.value;
@@ -55,12 +57,14 @@ OptionalError VideoSampleEncoder::encode(const SampleBuffer& sample, const Media
 class AudioSampleEncoder : public SampleEncoder {
   public:
     Result<TrackFormat> open(const Dictionary& outputSettings, SampleHandler handler) override;
-    OptionalError encode(const SampleBuffer& sample, const MediaTime& start) override;
-    OptionalError flush() override;
+    OptionalError encode(const SampleBuffer& sample, const MovieTimeline& timeline) override;
+    OptionalError flush(const MovieTimeline& timeline) override;
 
   private:
     std::unique_ptr<AudioEncoder> encoder_;
     std::optional<AudioAligner> aligner_;
+    std::optional<SoundCutter> cutter_;
+    MediaTime start_;
     bool complained_ = false;
 };
 
@@ -71,20 +75,25 @@ Result<TrackFormat> AudioSampleEncoder::open(const Dictionary& outputSettings, S
     if (!encoder) return encoder.error();
     encoder_ = std::move(*encoder);
     aligner_.emplace(settings->sampleRate, *encoder_);
+    cutter_.emplace([this](PcmBlock block, const MediaTime& sourceTime, AudioAligner::Joint joint) {
+        return aligner_->add(std::move(block), (sourceTime - start_).seconds(), joint);
+    });
     return encoder_->trackFormat();
 }
 
-OptionalError AudioSampleEncoder::encode(const SampleBuffer& sample, const MediaTime& start) {
+OptionalError AudioSampleEncoder::encode(const SampleBuffer& sample, const MovieTimeline& timeline) {
+    start_ = timeline.start();
     auto block = readPcm(sample);
-    if (block) return aligner_->add(std::move(*block), (sample.presentationTime() - start).seconds());
+    if (block) return cutter_->add(std::move(*block), sample.presentationTime(), timeline);
     if (!complained_) KVLogError("dropping audio: %s", block.error().localizedFailureReason().c_str());
     complained_ = true;
     return std::nullopt;
 }
 
-OptionalError AudioSampleEncoder::flush() {
-    const OptionalError error = aligner_->flush();
-    return error ? error : encoder_->flush();
+OptionalError AudioSampleEncoder::flush(const MovieTimeline& timeline) {
+    if (OptionalError error = cutter_->flush(timeline)) return error;
+    if (OptionalError error = aligner_->flush()) return error;
+    return encoder_->flush();
 }
 
 }  // namespace

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/MovieTimeline.h"
 #include "base/Result.h"
 #include "base/SampleBuffer.h"
 #include "base/Value.h"
@@ -23,11 +24,11 @@ class SampleEncoder {
     /// Opens the encoder; `handler` then gets what comes out, within `encode` and `flush`.
     virtual Result<TrackFormat> open(const Dictionary& outputSettings, SampleHandler handler) = 0;
 
-    /// Encodes a sample; the movie's timeline begins at `start`. A sample that cannot be used is dropped,
+    /// Encodes a sample, whose place in the movie `timeline` tells. A sample that cannot be used is dropped,
     /// which is no failure.
-    virtual OptionalError encode(const SampleBuffer& sample, const MediaTime& start) = 0;
+    virtual OptionalError encode(const SampleBuffer& sample, const MovieTimeline& timeline) = 0;
 
-    virtual OptionalError flush() = 0;
+    virtual OptionalError flush(const MovieTimeline& timeline) = 0;
 };
 
 /// The encoder for tracks of `type`.

@@ -7,6 +7,7 @@
 #include <poll.h>
 #include <sys/eventfd.h>
 #include <sys/signalfd.h>
+#include <unistd.h>
 #include <utility>
 
 namespace kelvo {
@@ -25,6 +26,11 @@ TerminationSignals::~TerminationSignals() {
     if (!watcher_.joinable()) return;
     ::eventfd_write(stopEvent_.get(), 1);
     watcher_.join();
+}
+
+void TerminationSignals::exitAfter(unsigned seconds) {
+    std::signal(SIGALRM, [](int) { ::_exit(0); });
+    ::alarm(seconds);
 }
 
 void TerminationSignals::watch(std::function<void()> handler) {

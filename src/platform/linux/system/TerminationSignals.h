@@ -19,6 +19,9 @@ class TerminationSignals {
     /// Runs `handler` for the first signal, on a thread of its own. Once.
     void watch(std::function<void()> handler);
 
+    /// Ends the process with status 0, wherever it is then, after that many seconds.
+    static void exitAfter(unsigned seconds);
+
   private:
     UniqueFd signals_;
     UniqueFd stopEvent_;

@@ -8,11 +8,8 @@
 #include <ctime>
 #include <poll.h>
 #include <utility>
-#include <xcb/composite.h>
 #include <xcb/damage.h>
-#include <xcb/render.h>
 #include <xcb/xfixes.h>
-#include <xcb/xinput.h>
 
 namespace kelvo::x11 {
 namespace {
@@ -69,11 +66,6 @@ bool CaptureLoop::begin() {
 
 bool CaptureLoop::hasExtensions() {
     xcb_connection_t* const c = connection_->raw();
-    // Asked ahead and awaited our way: libxcb's own wait for them could not be interrupted.
-    for (xcb_extension_t* const extension :
-         {&xcb_shm_id, &xcb_damage_id, &xcb_xfixes_id, &xcb_render_id, &xcb_composite_id, &xcb_input_id})
-        xcb_prefetch_extension_data(c, extension);
-    if (!connection_->await<xcb_get_input_focus_reply_t>(xcb_get_input_focus(c))) return false;
     for (xcb_extension_t* const extension : {&xcb_shm_id, &xcb_damage_id, &xcb_xfixes_id}) {
         if (!connection_->hasExtension(*extension)) return false;
     }

@@ -5,7 +5,6 @@
 #include <algorithm>
 #include <string>
 #include <utility>
-#include <xcb/res.h>
 
 namespace kelvo::x11 {
 namespace {
@@ -35,44 +34,36 @@ struct DesktopReader::Asked {
     xcb_get_property_cookie_t state;
     xcb_get_property_cookie_t type;
     xcb_get_property_cookie_t desktop;
+    xcb_res_query_client_ids_cookie_t creator;
 };
 
-/// What holds for all windows of one look.
+/// One look: what holds for all windows, and what they gave.
 struct DesktopReader::Context {
     xcb_window_t active;
     std::uint32_t desktop;
+    std::map<std::int32_t, DesktopApplication> applications;
+    std::vector<DesktopWindow> visible;  ///< from the bottom to the top
 };
 
 std::optional<DesktopReader> DesktopReader::open(XConnection& connection) {
-    if (!connection.hasExtension(xcb_res_id)) return std::nullopt;
-    if (!connection.await<xcb_res_query_version_reply_t>(xcb_res_query_version(connection.raw(), 1, 2)))
-        return std::nullopt;
+    if (!canTellCreators(connection)) return std::nullopt;
     return DesktopReader(connection);
 }
 
 std::optional<DesktopView> DesktopReader::read() {
     hasManager_ = windowManagersWindow(*connection_) != XCB_NONE;
     windows_ = topLevelWindows();
-    const Context context{activeWindow(), currentDesktop()};
+    Context context{activeWindow(), currentDesktop(), {}, {}};
     std::vector<Asked> asked;
     for (const xcb_window_t window : windows_)
         asked.push_back(ask(window));
-    std::vector<DesktopWindow> visible;
     for (const Asked& one : asked)
-        take(one, context, visible);
-    std::erase_if(processes_, [this](const auto& entry) { return !holds(windows_, entry.first); });
+        take(one, context);
 
     DesktopView view;
-    std::map<std::int32_t, DesktopApplication> applications;
-    for (const auto& [window, process] : processes_)
-        applications[process].processIdentifier = process;
-    for (const DesktopWindow& window : visible) {
-        applications[window.processIdentifier].isVisible = true;
-        applications[window.processIdentifier].isActive |= window.isActive;
-    }
-    for (const auto& [process, application] : applications)
+    for (const auto& [process, application] : context.applications)
         view.applications.push_back(application);
-    view.sharing = countSharing(visible, area(context.desktop));
+    view.sharing = countSharing(context.visible, area(context.desktop));
     if (connection_->isBroken() || connection_->hasGivenUp()) return std::nullopt;
     return view;
 }
@@ -94,6 +85,10 @@ bool DesktopReader::selectEvents() {
     }
     selected_ = std::move(wanted);
     return isNew;
+}
+
+void DesktopReader::forget(xcb_window_t window) {
+    std::erase(selected_, window);
 }
 
 /// From the bottom to the top.
@@ -154,44 +149,46 @@ DesktopReader::Asked DesktopReader::ask(xcb_window_t window) {
             xcb_translate_coordinates(c, window, connection_->root(), 0, 0),
             property("_NET_WM_STATE"),
             property("_NET_WM_WINDOW_TYPE"),
-            property("_NET_WM_DESKTOP")};
+            property("_NET_WM_DESKTOP"),
+            askCreator(*connection_, window)};
 }
 
 /// Notes whose window it is, and where, if the user can see it.
-void DesktopReader::take(const Asked& asked, const Context& context, std::vector<DesktopWindow>& visible) {
+void DesktopReader::take(const Asked& asked, Context& context) {
     const auto attributes = connection_->await<xcb_get_window_attributes_reply_t>(asked.attributes);
     const auto geometry = connection_->await<xcb_get_geometry_reply_t>(asked.geometry);
     const auto origin = connection_->await<xcb_translate_coordinates_reply_t>(asked.origin);
     const auto state = itemsOf(connection_->await<xcb_get_property_reply_t>(asked.state).get());
     const auto types = itemsOf(connection_->await<xcb_get_property_reply_t>(asked.type).get());
     const auto desktops = itemsOf(connection_->await<xcb_get_property_reply_t>(asked.desktop).get());
+    // Asked each time: a program that starts may get the number of a window that went.
+    const auto process = creatorIn(*connection_, asked.creator);
     if (!attributes || !geometry || !origin || attributes->_class != XCB_WINDOW_CLASS_INPUT_OUTPUT) return;
     if (!hasManager_ && attributes->override_redirect != 0) return;
     for (const char* furniture :
          {"_NET_WM_WINDOW_TYPE_DESKTOP", "_NET_WM_WINDOW_TYPE_DOCK", "_NET_WM_WINDOW_TYPE_NOTIFICATION"}) {
         if (holds(types, atom(furniture))) return;
     }
-    const auto process = processOf(asked.window);
+    if (!process) return;
+    DesktopApplication& application = context.applications[*process];
+    application.processIdentifier = *process;
     const bool isElsewhere = !desktops.empty() && desktops.front() != kAllDesktops &&
                              context.desktop != kAllDesktops && desktops.front() != context.desktop;
     const bool isHidden = holds(state, atom("_NET_WM_STATE_HIDDEN"));
-    if (!process || isElsewhere || isHidden || attributes->map_state != XCB_MAP_STATE_VIEWABLE) return;
-    visible.push_back({*process, origin->dst_x, origin->dst_y, geometry->width, geometry->height,
-                       asked.window == context.active});
-}
-
-std::optional<std::int32_t> DesktopReader::processOf(xcb_window_t window) {
-    const auto known = processes_.find(window);
-    if (known != processes_.end()) return known->second;
-    const auto process = creatorOf(*connection_, window);
-    if (process) processes_[window] = *process;
-    return process;
+    if (isElsewhere || isHidden || attributes->map_state != XCB_MAP_STATE_VIEWABLE) return;
+    const bool isActive = asked.window == context.active;
+    application.isVisible = true;
+    application.isActive |= isActive;
+    context.visible.push_back(
+        {*process, origin->dst_x, origin->dst_y, geometry->width, geometry->height, isActive});
 }
 
 xcb_atom_t DesktopReader::atom(std::string_view name) {
     const auto known = atoms_.find(name);
     if (known != atoms_.end()) return known->second;
-    return atoms_.emplace(name, connection_->atom(name)).first->second;
+    const xcb_atom_t asked = connection_->atom(name);
+    if (asked != XCB_ATOM_NONE) atoms_.emplace(name, asked);
+    return asked;
 }
 
 std::vector<std::uint32_t> DesktopReader::rootItems(std::string_view property) {

@@ -25,6 +25,9 @@ class DesktopReader {
     /// last `read` saw. Says whether there was anything to ask for that had not been asked for before.
     bool selectEvents();
 
+    /// Another window may have this number from now on.
+    void forget(xcb_window_t window);
+
   private:
     struct Asked;
     struct Context;
@@ -36,16 +39,14 @@ class DesktopReader {
     DesktopArea area(std::uint32_t desktop);
     std::uint32_t currentDesktop();
     Asked ask(xcb_window_t window);
-    void take(const Asked& asked, const Context& context, std::vector<DesktopWindow>& visible);
-    std::optional<std::int32_t> processOf(xcb_window_t window);
+    void take(const Asked& asked, Context& context);
     xcb_atom_t atom(std::string_view name);
     std::vector<std::uint32_t> rootItems(std::string_view property);
 
     XConnection* connection_;
     bool hasManager_ = false;
     std::vector<xcb_window_t> windows_;
-    std::map<xcb_window_t, std::int32_t> processes_;  ///< who made a window does not change
-    std::vector<xcb_window_t> selected_;              ///< whose events we get
+    std::vector<xcb_window_t> selected_;  ///< whose events we get
     std::map<std::string, xcb_atom_t, std::less<>> atoms_;
 };
 

@@ -17,6 +17,9 @@ constexpr int kRetryMilliseconds = 1000;
 /// A window that is dragged tells of each step; one look serves all that come within this time.
 constexpr int kGatheringMilliseconds = 30;
 constexpr std::size_t kMostProcesses = 256;
+/// A desktop on which windows keep coming is looked at again when it has told of them.
+constexpr int kMostLooks = 8;
+constexpr int kEventTypeMask = 0x7F;
 
 UniqueFd processDescriptor(std::int32_t process) {
     return UniqueFd(static_cast<int>(::syscall(SYS_pidfd_open, process, 0)));
@@ -69,6 +72,7 @@ void DesktopWatch::watch(const Handler& handler) {
     bool isReachable = true;
     while (!isStopping_) {
         if (!connect()) {
+            if (!wait(0)) return;
             if (std::exchange(isReachable, false))
                 KVLogError("cannot reach the display; what it shows is unknown until it is there");
             report({}, handler);
@@ -76,26 +80,33 @@ void DesktopWatch::watch(const Handler& handler) {
             continue;
         }
         isReachable = true;
-        auto view = reader_->read();
-        if (view) {
-            followProcesses(*view);
-            // What changed before the server knew of our interest told nothing: one more look.
-            if (reader_->selectEvents()) view = reader_->read();
-        }
-        if (view) report(std::move(*view), handler);
+        auto view = look();
         if (!view) {
             if (connection_->isBroken()) disconnect();
             if (!wait(0)) return;
             continue;
         }
-        if (!hasEventInQueue() && !wait(-1)) return;
-        if (!wait(kGatheringMilliseconds)) return;
+        report(std::move(*view), handler);
+        if (!takeEvents() && !wait(-1)) return;
+        if (!gather()) return;
         takeEvents();
     }
 }
 
+/// The view, with word from the server at whatever changes it from now on; none when it stopped answering.
+std::optional<DesktopView> DesktopWatch::look() {
+    auto view = reader_->read();
+    for (int looks = 1; view && looks < kMostLooks; ++looks) {
+        followProcesses(*view);
+        // What changed before the server knew of our interest told nothing: one more look.
+        if (!reader_->selectEvents()) break;
+        view = reader_->read();
+    }
+    return view;
+}
+
 bool DesktopWatch::connect() {
-    if (connection_ && !connection_->isBroken()) {
+    if (reader_ && !connection_->isBroken()) {
         connection_->tryAgain();
         return true;
     }
@@ -140,33 +151,38 @@ void DesktopWatch::addUnseenProcesses(DesktopView& view) const {
 /// another.
 bool DesktopWatch::wait(int milliseconds) {
     std::vector<pollfd> waits{{wake_.descriptor(), POLLIN, 0}};
-    // While events are gathered those that are there already would end the wait.
-    const bool isGathering = milliseconds == kGatheringMilliseconds;
-    if (connection_ && !isGathering) {
+    if (connection_) {
         xcb_flush(connection_->raw());
         waits.push_back({xcb_get_file_descriptor(connection_->raw()), POLLIN, 0});
     }
-    if (!isGathering) {
-        for (const auto& [process, descriptor] : processes_)
-            waits.push_back({descriptor.get(), POLLIN, 0});
-    }
+    for (const auto& [process, descriptor] : processes_)
+        waits.push_back({descriptor.get(), POLLIN, 0});
     while (::poll(waits.data(), waits.size(), milliseconds) < 0 && errno == EINTR) {
     }
     return waits[0].revents == 0;
+}
+
+/// Lets a moment pass, in which further events come; false when the handler may be another.
+bool DesktopWatch::gather() {
+    pollfd wake{wake_.descriptor(), POLLIN, 0};
+    while (::poll(&wake, 1, kGatheringMilliseconds) < 0 && errno == EINTR) {
+    }
+    return wake.revents == 0;
 }
 
 void DesktopWatch::dropEndedProcesses() {
     std::erase_if(processes_, [](const auto& entry) { return hasEnded(entry.second); });
 }
 
-/// libxcb reads events along with replies; these no longer make the socket readable.
-bool DesktopWatch::hasEventInQueue() {
-    return XOwned<xcb_generic_event_t>(xcb_poll_for_queued_event(connection_->raw())) != nullptr;
-}
-
-void DesktopWatch::takeEvents() {
+/// Says whether there were any, of which libxcb may have read some along with replies.
+bool DesktopWatch::takeEvents() {
+    bool isAny = false;
     while (const XOwned<xcb_generic_event_t> event{xcb_poll_for_event(connection_->raw())}) {
+        isAny = true;
+        if ((event->response_type & kEventTypeMask) == XCB_DESTROY_NOTIFY)
+            reader_->forget(reinterpret_cast<const xcb_destroy_notify_event_t*>(event.get())->window);
     }
+    return isAny;
 }
 
 }  // namespace kelvo::x11

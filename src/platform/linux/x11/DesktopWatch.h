@@ -3,7 +3,7 @@
 #include "base/Guarded.h"
 #include "base/UniqueFd.h"
 #include "platform/linux/x11/DesktopReader.h"
-#include "platform/linux/x11/MirroringState.h"
+#include "platform/linux/x11/WakeEvent.h"
 
 #include <atomic>
 #include <functional>
@@ -29,8 +29,7 @@ class DesktopWatch {
     DesktopWatch& operator=(const DesktopWatch&) = delete;
 
     /// Calls `handler` with the view as it is and each time that it has changed; with an empty one nobody
-    /// watches.
-    /// The processes of `known` count as seen.
+    /// watches. The processes of `known` count as seen.
     void setHandler(Handler handler, DesktopView known = {});
 
   private:
@@ -42,9 +41,10 @@ class DesktopWatch {
     void followProcesses(const DesktopView& view);
     void addUnseenProcesses(DesktopView& view) const;
     bool wait(int milliseconds);
+    bool gather();
     void dropEndedProcesses();
-    bool hasEventInQueue();
-    void takeEvents();
+    std::optional<DesktopView> look();
+    bool takeEvents();
 
     const std::string display_;
     struct Task {

@@ -1,20 +1,8 @@
 #include "platform/linux/x11/MirroringState.h"
 
-#include <sys/eventfd.h>
 #include <utility>
 
 namespace kelvo::x11 {
-
-WakeEvent::WakeEvent() : descriptor_(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {}
-
-void WakeEvent::set() {
-    ::eventfd_write(descriptor_.get(), 1);
-}
-
-void WakeEvent::clear() {
-    eventfd_t value = 0;
-    ::eventfd_read(descriptor_.get(), &value);
-}
 
 Mirroring MirroringState::current() const {
     return shared_.with([](const Shared& shared) { return shared.mirroring; });

@@ -1,8 +1,8 @@
 #pragma once
 
 #include "base/Guarded.h"
-#include "base/UniqueFd.h"
 #include "platform/ScreenCapture.h"
+#include "platform/linux/x11/WakeEvent.h"
 
 #include <cstdint>
 #include <memory>
@@ -17,20 +17,6 @@ struct Mirroring {
     std::set<std::uint32_t> contexts;
 
     friend bool operator==(const Mirroring&, const Mirroring&) = default;
-};
-
-/// An event that one thread sets and others wait for with poll. Thread-safe.
-class WakeEvent {
-  public:
-    WakeEvent();
-
-    void set();
-    void clear();
-    /// Readable while the event is set; -1 when the process was out of descriptors.
-    int descriptor() const { return descriptor_.get(); }
-
-  private:
-    UniqueFd descriptor_;
 };
 
 /// The mirroring that all screen sources of one display share. Thread-safe.

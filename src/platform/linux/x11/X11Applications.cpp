@@ -1,12 +1,9 @@
 #include "platform/linux/x11/X11Applications.h"
 
-#include <chrono>
 #include <utility>
 
 namespace kelvo::x11 {
 namespace {
-
-constexpr std::chrono::seconds kReplyLimit{2};
 
 std::int32_t stateOf(const DesktopApplication& application) {
     if (application.isActive) return kApplicationStateForeground;
@@ -27,14 +24,20 @@ X11Applications::X11Applications(std::string display, std::shared_ptr<BundleServ
 X11Applications::~X11Applications() = default;
 
 void X11Applications::setUpdateHandler(UpdateHandler handler) {
-    const bool isWanted = handler != nullptr;
-    const DesktopView seen = isWanted ? currentView() : DesktopView();
-    Known known = applicationsIn(seen, {});
-    queue_.async([this, handler = std::move(handler), known = std::move(known)]() mutable {
-        handler_ = std::move(handler);
-        known_ = std::move(known);
+    const int order = handler_.with([](Installed& installed) {
+        installed.handler.reset();
+        return ++installed.order;
     });
-    if (!isWanted) return watch_.setHandler(nullptr);
+    if (!handler) return watch_.setHandler(nullptr);
+    const DesktopView seen = currentView();
+    // In its turn, so that it hears nothing of what the one before it was still to hear.
+    queue_.async([this, order, handler = std::move(handler), known = applicationsIn(seen, {})]() mutable {
+        known_ = std::move(known);
+        handler_.with([&](Installed& installed) {
+            if (installed.order == order)
+                installed.handler = std::make_shared<UpdateHandler>(std::move(handler));
+        });
+    });
     watch_.setHandler([this](const DesktopView& view) { queue_.async([this, view] { viewChanged(view); }); },
                       seen);
 }
@@ -77,13 +80,13 @@ std::optional<ApplicationInformation> X11Applications::find(std::string_view bun
 
 DesktopView X11Applications::currentView() {
     const std::lock_guard lock(connectionMutex_);
-    if (!connection_ || connection_->isBroken()) {
+    // A server that stands still would let what it is asked pile up.
+    if (!reader_ || connection_->isBroken() || connection_->hasGivenUp()) {
         reader_.reset();
-        connection_ = XConnection::open(display_, -1, kReplyLimit);
+        connection_ = XConnection::open(display_);
         if (connection_) reader_ = DesktopReader::open(*connection_);
     }
-    if (!connection_ || !reader_) return {};
-    connection_->tryAgain();
+    if (!reader_) return {};
     return reader_->read().value_or(DesktopView());
 }
 
@@ -115,8 +118,6 @@ std::string X11Applications::identifierOf(std::int32_t processIdentifier) const 
 
 /// Tells of those that lost something before it tells who is in front now.
 void X11Applications::viewChanged(const DesktopView& view) {
-    if (!handler_) return;
-    const UpdateHandler handler = handler_;
     const Known before = std::exchange(known_, applicationsIn(view, known_));
     std::vector<ApplicationInformation> changes;
     for (const auto& [process, information] : before) {
@@ -131,8 +132,9 @@ void X11Applications::viewChanged(const DesktopView& view) {
             if (!isOld && information.isFrontmost == isFrontmost) changes.push_back(information);
         }
     }
-    for (const ApplicationInformation& change : changes)
-        handler(change);
+    for (const ApplicationInformation& change : changes) {
+        if (const auto handler = handler_.copy().handler) (*handler)(change);
+    }
 }
 
 }  // namespace kelvo::x11

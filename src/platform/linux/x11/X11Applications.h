@@ -18,7 +18,9 @@ namespace kelvo::x11 {
 /// in the background. A program without a bundle goes by its path. Where no display can be reached nothing
 /// runs.
 ///
-/// Each query asks the server anew, waiting two seconds at most. Thread-safe.
+/// Each query asks the server anew, waiting two seconds at most, and knows those alone that have windows;
+/// queries wait for each other. While a server stands still nothing runs, as far as queries can tell, and the
+/// watch tells of no change. Thread-safe.
 class X11Applications : public ApplicationStateSource {
   public:
     X11Applications(std::string display, std::shared_ptr<BundleService> bundles);
@@ -46,9 +48,12 @@ class X11Applications : public ApplicationStateSource {
     std::unique_ptr<XConnection> connection_;
     std::optional<DesktopReader> reader_;
 
-    // On the queue.
-    UpdateHandler handler_;
-    Known known_;
+    struct Installed {
+        std::shared_ptr<UpdateHandler> handler;
+        int order = 0;  ///< counts the calls of `setUpdateHandler`
+    };
+    Guarded<Installed> handler_;
+    Known known_;  // on the queue
 
     SerialQueue queue_{"com.quillon.kelvod.applications"};
     DesktopWatch watch_;  // ends before what its handler uses

@@ -22,7 +22,7 @@ DisplayLayout layoutOf(const DesktopView& view) {
 class Monitor : public DisplayLayoutMonitor {
   public:
     explicit Monitor(const std::string& display) : watch_(display) {
-        const auto connection = XConnection::open(display, -1, std::chrono::seconds(2));
+        const auto connection = XConnection::open(display);
         auto reader = connection ? DesktopReader::open(*connection) : std::nullopt;
         const auto view = reader ? reader->read() : std::nullopt;
         layout_.set(layoutOf(view.value_or(DesktopView())));

@@ -9,7 +9,7 @@ namespace kelvo::x11 {
 
 /// The layout of an X display: one element of level 1 for each application that shares the screen with others
 /// side by side, and one alone when they lie above each other as on any desktop. An empty desktop is one
-/// element of level 0. What a display showed last stays its layout when it is lost. Thread-safe.
+/// element of level 0, and so is a display that cannot be reached. Thread-safe.
 class X11DisplayLayout : public DisplayLayoutService {
   public:
     explicit X11DisplayLayout(std::string display) : display_(std::move(display)) {}

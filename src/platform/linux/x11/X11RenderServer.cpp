@@ -2,13 +2,9 @@
 
 #include "platform/linux/x11/XWindows.h"
 
-#include <chrono>
-#include <xcb/res.h>
-
 namespace kelvo::x11 {
 namespace {
 
-constexpr std::chrono::seconds kReplyLimit{2};
 constexpr int kDeepestHierarchy = 32;
 
 }  // namespace
@@ -26,14 +22,12 @@ std::optional<std::int32_t> X11RenderServer::processIdentifierOfContext(std::uin
 }
 
 bool X11RenderServer::connect() {
-    if (connection_ && !connection_->isBroken()) {
-        connection_->tryAgain();
-        return true;
-    }
-    connection_ = XConnection::open(display_, -1, kReplyLimit);
-    if (!connection_ || !connection_->hasExtension(xcb_res_id)) return false;
-    return connection_->await<xcb_res_query_version_reply_t>(
-               xcb_res_query_version(connection_->raw(), 1, 2)) != nullptr;
+    // A server that stands still would let what it is asked pile up.
+    if (connection_ && !connection_->isBroken() && !connection_->hasGivenUp()) return true;
+    connection_ = XConnection::open(display_);
+    // One that did not answer so far is of no use later: its extension may not be asked for anything.
+    if (connection_ && !canTellCreators(*connection_)) connection_.reset();
+    return connection_ != nullptr;
 }
 
 /// Asked apart, because the server tells the creator of any number in a client's range.

@@ -3,7 +3,6 @@
 #include "platform/linux/x11/X11ScreenCapture.h"
 #include "platform/linux/x11/XConnection.h"
 
-#include <chrono>
 #include <vector>
 #include <xcb/randr.h>
 
@@ -12,7 +11,6 @@ namespace {
 
 constexpr float kPortrait = 0;
 constexpr float kLandscape = 90;
-constexpr std::chrono::seconds kReplyLimit{2};
 
 using Outputs = xcb_randr_get_screen_resources_current_reply_t;
 using Output = xcb_randr_get_output_info_reply_t;
@@ -53,7 +51,7 @@ std::shared_ptr<ScreenCaptureSource> X11Screen::createSource(const Size& size,
 }
 
 std::optional<float> nativeScreenOrientation(const std::string& display) {
-    const auto connection = XConnection::open(display, -1, kReplyLimit);
+    const auto connection = XConnection::open(display);
     if (!connection || !connection->hasExtension(xcb_randr_id)) return std::nullopt;
     xcb_connection_t* const c = connection->raw();
     connection->await<xcb_randr_query_version_reply_t>(xcb_randr_query_version(c, 1, 5));

@@ -33,7 +33,7 @@ class X11Screen : public ScreenCaptureService, public DisplayMirroring {
 
 /// How the screen of `display` was built to be held, as `DeviceProperties::mainScreenOrientation` tells it: 0
 /// when its panel is at least as high as it is wide, 90 when it is wider, however it is turned now. None when
-/// the display cannot be asked.
+/// the display cannot be asked; one that stands still is asked for two seconds (`XConnection::kReplyLimit`).
 std::optional<float> nativeScreenOrientation(const std::string& display);
 
 }  // namespace kelvo::x11

@@ -1,5 +1,7 @@
 #include "platform/linux/x11/XConnection.h"
 
+#include "platform/linux/x11/XHandshake.h"
+
 #include <array>
 #include <cerrno>
 #include <poll.h>
@@ -17,13 +19,20 @@ const xcb_screen_t* screenAt(xcb_connection_t* connection, int number) {
 
 }  // namespace
 
+std::unique_ptr<XConnection> XConnection::open(const std::string& display) {
+    return open(display, -1, kReplyLimit);
+}
+
+std::unique_ptr<XConnection> XConnection::open(const std::string& display, int interruptFd) {
+    return open(display, interruptFd, std::nullopt);
+}
+
 std::unique_ptr<XConnection> XConnection::open(const std::string& display, int interruptFd,
                                                TimeLimit replyLimit) {
     int screenNumber = 0;
-    xcb_connection_t* const connection =
-        xcb_connect(display.empty() ? nullptr : display.c_str(), &screenNumber);
-    const bool isConnected = xcb_connection_has_error(connection) == 0;
-    const xcb_screen_t* const screen = isConnected ? screenAt(connection, screenNumber) : nullptr;
+    xcb_connection_t* const connection = connectTo(display, screenNumber, interruptFd, replyLimit);
+    if (connection == nullptr) return nullptr;
+    const xcb_screen_t* const screen = screenAt(connection, screenNumber);
     if (screen == nullptr) {
         xcb_disconnect(connection);
         return nullptr;
@@ -51,7 +60,10 @@ bool XConnection::drawsBGRx() const {
     return false;
 }
 
-bool XConnection::hasExtension(xcb_extension_t& extension) const {
+bool XConnection::hasExtension(xcb_extension_t& extension) {
+    // Asked ahead and awaited our way: libxcb's own wait for the answer could not be ended.
+    xcb_prefetch_extension_data(connection_, &extension);
+    if (!await<xcb_get_input_focus_reply_t>(xcb_get_input_focus(connection_))) return false;
     const xcb_query_extension_reply_t* const reply = xcb_get_extension_data(connection_, &extension);
     return reply != nullptr && reply->present != 0;
 }

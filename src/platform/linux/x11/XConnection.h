@@ -20,17 +20,20 @@ using XOwned = std::unique_ptr<Content, XFree>;
 
 /// A client's connection to an X server. One thread at a time; nothing of the server's outlives it.
 ///
-/// Waiting for a reply never outlasts the server: it ends, without a reply, when the connection breaks, when
-/// the interrupt descriptor becomes readable and when the time limit passes. Once it ended for one of the
-/// last two reasons no reply is waited for until `tryAgain`.
+/// Waiting for a reply never outlasts the server: it ends, without a reply, when the connection breaks, and
+/// with a server that stands still either after `kReplyLimit` or when the interrupt descriptor becomes
+/// readable, whichever it was opened with. Once it ended for one of the last two reasons no reply is waited
+/// for until `tryAgain`. An extension's requests may be sent once `hasExtension` has told of it; before that,
+/// libxcb would wait for the server in its own way, which has no end.
 class XConnection {
   public:
-    using TimeLimit = std::optional<std::chrono::milliseconds>;
+    static constexpr std::chrono::seconds kReplyLimit{2};
 
-    /// Connects to `display` (":0"; empty takes $DISPLAY). `interruptFd` is -1 or outlives the connection.
-    /// None when the display cannot be reached.
-    static std::unique_ptr<XConnection> open(const std::string& display, int interruptFd = -1,
-                                             TimeLimit replyLimit = std::nullopt);
+    /// Connects to `display` (":0"; empty takes $DISPLAY), which must be on this machine. None when it cannot
+    /// be reached, within `kReplyLimit`.
+    static std::unique_ptr<XConnection> open(const std::string& display);
+    /// The same, but waits until `interruptFd`, which outlives the connection, becomes readable.
+    static std::unique_ptr<XConnection> open(const std::string& display, int interruptFd);
 
     ~XConnection();
     XConnection(const XConnection&) = delete;
@@ -48,7 +51,7 @@ class XConnection {
 
     /// Whether the server stores a pixel of a 24-bit deep picture as blue, green, red and a spare byte.
     bool drawsBGRx() const;
-    bool hasExtension(xcb_extension_t& extension) const;
+    bool hasExtension(xcb_extension_t& extension);
 
     /// The reply to a request; none when the request failed or waiting ended.
     template <typename Reply, typename Cookie>
@@ -59,6 +62,10 @@ class XConnection {
     xcb_atom_t atom(std::string_view name);
 
   private:
+    using TimeLimit = std::optional<std::chrono::milliseconds>;
+
+    static std::unique_ptr<XConnection> open(const std::string& display, int interruptFd,
+                                             TimeLimit replyLimit);
     XConnection(xcb_connection_t* connection, const xcb_screen_t* screen, int interruptFd,
                 TimeLimit replyLimit);
     void* awaitReply(unsigned sequence);

@@ -1,7 +1,5 @@
 #include "platform/linux/x11/XWindows.h"
 
-#include <xcb/res.h>
-
 namespace kelvo::x11 {
 namespace {
 
@@ -9,10 +7,24 @@ constexpr std::uint32_t kMostItems = 4096;
 
 }  // namespace
 
+bool canTellCreators(XConnection& connection) {
+    if (!connection.hasExtension(xcb_res_id)) return false;
+    const auto version =
+        connection.await<xcb_res_query_version_reply_t>(xcb_res_query_version(connection.raw(), 1, 2));
+    return version != nullptr;
+}
+
 std::optional<std::int32_t> creatorOf(XConnection& connection, xcb_window_t window) {
+    return creatorIn(connection, askCreator(connection, window));
+}
+
+xcb_res_query_client_ids_cookie_t askCreator(XConnection& connection, xcb_window_t window) {
     const xcb_res_client_id_spec_t asked{window, XCB_RES_CLIENT_ID_MASK_LOCAL_CLIENT_PID};
-    const auto reply = connection.await<xcb_res_query_client_ids_reply_t>(
-        xcb_res_query_client_ids(connection.raw(), 1, &asked));
+    return xcb_res_query_client_ids(connection.raw(), 1, &asked);
+}
+
+std::optional<std::int32_t> creatorIn(XConnection& connection, xcb_res_query_client_ids_cookie_t asked) {
+    const auto reply = connection.await<xcb_res_query_client_ids_reply_t>(asked);
     if (!reply) return std::nullopt;
     auto each = xcb_res_query_client_ids_ids_iterator(reply.get());
     for (; each.rem > 0; xcb_res_client_id_value_next(&each)) {

@@ -18,12 +18,13 @@ std::string problem(const std::vector<const char*>& arguments) {
 }
 
 TEST(CommandLineTest, EveryCommandIsKnown) {
-    const std::array<std::pair<const char*, Command>, 8> commands{{{"record", Command::record},
+    const std::array<std::pair<const char*, Command>, 9> commands{{{"record", Command::record},
                                                                    {"stop", Command::stop},
                                                                    {"pause", Command::pause},
                                                                    {"resume", Command::resume},
                                                                    {"status", Command::status},
                                                                    {"extensions", Command::extensions},
+                                                                   {"library", Command::library},
                                                                    {"watch", Command::watch},
                                                                    {"shell", Command::shell}}};
     for (const auto& [name, command] : commands) {
@@ -58,6 +59,17 @@ TEST(CommandLineTest, WhatIsWrongIsSaid) {
     EXPECT_EQ(problem({"status", "--socket"}), "--socket needs a path");
 }
 
+TEST(CommandLineTest, LibraryIsListedOrRecovered) {
+    EXPECT_FALSE(parse({"library"})->isRecovery);
+    const auto line = parse({"library", "recover", "--json"});
+    ASSERT_TRUE(line);
+    EXPECT_EQ(line->command, Command::library);
+    EXPECT_TRUE(line->isRecovery);
+    EXPECT_EQ(problem({"library", "recover", "recover"}), "unexpected argument recover");
+    EXPECT_EQ(problem({"status", "recover"}), "unexpected argument recover");
+    EXPECT_EQ(problem({"recover"}), "unknown command recover");
+}
+
 TEST(CommandLineTest, ButtonsThatAnswerAreKnown) {
     EXPECT_EQ(parse({"shell", "--answer", "default"})->answer, SystemAlertResponse::defaultButton);
     EXPECT_EQ(parse({"shell", "--answer", "alternate"})->answer, SystemAlertResponse::alternateButton);
@@ -85,7 +97,8 @@ TEST(CommandLineTest, HelpNeedsNoCommandAndOverlooksTheRest) {
 
 TEST(CommandLineTest, EveryCommandHasAHelpOfItsOwnAndStandsInTheOverview) {
     const std::string overview = CommandLine::helpText(Command::none);
-    for (const char* name : {"record", "stop", "pause", "resume", "status", "extensions", "watch", "shell"}) {
+    for (const char* name :
+         {"record", "stop", "pause", "resume", "status", "extensions", "library", "watch", "shell"}) {
         const std::string help = CommandLine::helpText(parse({name})->command);
         EXPECT_TRUE(help.starts_with(std::string("Usage: kelvoctl ") + name)) << help;
         EXPECT_NE(overview.find(std::string("\n  ") + name + " "), std::string::npos) << name;

@@ -1,6 +1,7 @@
 #include "platform/linux/x11/X11Applications.h"
 #include "platform/linux/x11/X11DisplayLayout.h"
-#include "platform/linux/x11/XWindows.h"
+#include "platform/linux/x11/X11RenderServer.h"
+#include "platform/linux/x11/XConnection.h"
 #include "platform/simulated/SimulatedDevice.h"
 #include "support/ChildProcess.h"
 #include "support/Eventually.h"
@@ -43,6 +44,12 @@ class X11ApplicationsTest : public testing::Test {
         SimulatedBundleContent content;
         content.bundleIdentifier = identifier;
         device_.bundles->addBundle(path, std::move(content));
+    }
+    std::vector<xcb_window_t> topLevelWindows() {
+        const XOwned<xcb_query_tree_reply_t> tree(
+            xcb_query_tree_reply(client_.raw(), xcb_query_tree(client_.raw(), client_.root()), nullptr));
+        const xcb_window_t* const children = xcb_query_tree_children(tree.get());
+        return {children, children + xcb_query_tree_children_length(tree.get())};
     }
     std::int32_t ownState() { return applications_.stateOfApplication("own"); }
 
@@ -200,6 +207,76 @@ TEST_F(X11ApplicationsTest, FrozenDisplayDoesNotHoldUpTheEnd) {
     server_.thaw();
 }
 
+TEST_F(X11ApplicationsTest, FrozenDisplayAnswersAgainOnceItGoesOn) {
+    client_.createWindow({0, 0, 50, 50}, 0, true);
+    EXPECT_TRUE(eventually([&] { return ownState() != kApplicationStateUnknown; }));
+    server_.freeze();
+    EXPECT_EQ(ownState(), kApplicationStateUnknown);
+    EXPECT_EQ(ownState(), kApplicationStateUnknown);
+    server_.thaw();
+    EXPECT_TRUE(eventually([&] { return ownState() != kApplicationStateUnknown; }));
+}
+
+TEST_F(X11ApplicationsTest, DisplayThatIsFrozenFromTheStartHoldsUpNobody) {
+    server_.freeze();
+    EXPECT_EQ(ownState(), kApplicationStateUnknown);
+    watch();
+    EXPECT_EQ(applications_.frontmostApplicationBundleIdentifier(), std::nullopt);
+    {
+        X11DisplayLayout service(server_.display());
+        EXPECT_EQ(service.createMonitor(0)->currentLayout().elements.size(), 1U);
+        X11RenderServer renderServer(server_.display());
+        EXPECT_EQ(renderServer.processIdentifierOfContext(1), std::nullopt);
+        X11Applications another(server_.display(), device_.bundles);
+        another.setUpdateHandler([](const ApplicationInformation&) {});
+    }
+    server_.thaw();
+    client_.createWindow({0, 0, 50, 50}, 0, true);
+    EXPECT_TRUE(wasTold("own", kApplicationStateForegroundObscured, false) ||
+                wasTold("own", kApplicationStateForeground, true));
+}
+
+TEST_F(X11ApplicationsTest, ProgramThatGotTheWindowNumberOfAnotherIsItself) {
+    auto first = startOther("60x60+100+100");
+    const auto numbers = topLevelWindows();
+    const int ended = first->processIdentifier();
+    first->signal(SIGKILL);
+    first->waitForExit();
+    // Nobody asks while there is no window.
+    const test::ChildProcess second({"xev", "-display", server_.display(), "-geometry", "60x60+100+100"});
+    ASSERT_TRUE(eventually([&] { return topLevelWindows() == numbers; }));
+    EXPECT_TRUE(applications_.informationOfProcess(second.processIdentifier()));
+    EXPECT_FALSE(applications_.informationOfProcess(ended));
+}
+
+TEST_F(X11ApplicationsTest, ApplicationOnAnotherDesktopIsInTheBackground) {
+    const test::WindowManager manager(server_.display());
+    ASSERT_TRUE(manager.isReady());
+    client_.createWindow({0, 0, 50, 50}, 0, true);
+    ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
+    watch();
+    test::ChildProcess change({"xdotool", "set_desktop", "1"}, {{"DISPLAY", server_.display()}});
+    EXPECT_TRUE(wasTold("own", kApplicationStateBackground, false));
+    EXPECT_EQ(applications_.frontmostApplicationBundleIdentifier(), std::nullopt);
+    test::ChildProcess back({"xdotool", "set_desktop", "0"}, {{"DISPLAY", server_.display()}});
+    EXPECT_TRUE(eventually([&] { return ownState() >= kApplicationStateForeground; }));
+}
+
+TEST_F(X11ApplicationsTest, FocusDecidesWhenTheWindowManagerDies) {
+    auto manager = std::make_unique<test::WindowManager>(server_.display());
+    ASSERT_TRUE(manager->isReady());
+    const auto window = client_.createWindow({0, 0, 50, 50}, 0, true);
+    ASSERT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
+    manager.reset();
+    xcb_set_input_focus(client_.raw(), XCB_INPUT_FOCUS_PARENT, client_.root(), XCB_CURRENT_TIME);
+    client_.sync();
+    EXPECT_TRUE(eventually([&] { return ownState() == kApplicationStateForegroundObscured; }));
+    client_.map(window);
+    xcb_set_input_focus(client_.raw(), XCB_INPUT_FOCUS_PARENT, window, XCB_CURRENT_TIME);
+    client_.sync();
+    EXPECT_TRUE(eventually([&] { return ownState() == kApplicationStateForeground; }));
+}
+
 TEST_F(X11ApplicationsTest, DisplayThatIsNotThereHasNoApplications) {
     X11Applications nowhere(":4711", device_.bundles);
     nowhere.setUpdateHandler([](const ApplicationInformation&) {});
@@ -234,6 +311,16 @@ TEST_F(X11ApplicationsTest, LayoutTellsHowManyShareTheScreen) {
     other->signal(SIGKILL);
     EXPECT_TRUE(eventually([&] { return monitor->currentLayout().elements.size() == 1; }));
     EXPECT_EQ(observer->elements, 2U);
+}
+
+TEST_F(X11ApplicationsTest, LostDisplayIsAnEmptyDesktop) {
+    X11DisplayLayout service(server_.display());
+    const auto monitor = service.createMonitor(0);
+    client_.createWindow({0, 0, 200, 300}, 0, true);
+    ASSERT_TRUE(eventually([&] { return monitor->currentLayout().elements[0].level == 1; }));
+    server_.kill();
+    EXPECT_TRUE(eventually([&] { return monitor->currentLayout().elements[0].level == 0; }));
+    EXPECT_EQ(monitor->currentLayout().elements.size(), 1U);
 }
 
 TEST_F(X11ApplicationsTest, InvalidatedLayoutMonitorTellsNothing) {

@@ -1,0 +1,17 @@
+#pragma once
+
+#include <chrono>
+#include <optional>
+#include <string>
+#include <xcb/xcb.h>
+
+namespace kelvo::x11 {
+
+/// Connects to the server of `display` (":0"; empty takes $DISPLAY), which must be on this machine, and gives
+/// up when `interruptFd` (-1 for none) becomes readable or when the server has not answered within `limit`.
+/// None when that did not come to a connection; `screen` is the number of the screen that the name asks for.
+/// The caller disconnects.
+xcb_connection_t* connectTo(const std::string& display, int& screen, int interruptFd,
+                            std::optional<std::chrono::milliseconds> limit);
+
+}  // namespace kelvo::x11
