@@ -6,6 +6,7 @@
 #include "platform/linux/log/JournalLog.h"
 #include "platform/linux/log/Readiness.h"
 #include "platform/linux/log/StderrLog.h"
+#include "platform/linux/system/DescriptorLimit.h"
 #include "platform/linux/system/InstanceLock.h"
 #include "platform/linux/system/Resources.h"
 #include "platform/linux/system/TerminationSignals.h"
@@ -43,6 +44,7 @@ int run(const Options& options) {
     ::umask(S_IRWXG | S_IRWXO);  // recordings are their owner's alone
     if (options.log == Options::Log::standardError) setLogSink(std::make_shared<StderrLog>());
     if (options.log == Options::Log::journal) setLogSink(std::make_shared<JournalLog>());
+    raiseDescriptorLimit();
     const auto root = std::make_shared<const DeviceRoot>(
         options.root, options.resourceFolder.empty() ? installedResourceFolder() : options.resourceFolder);
     const auto lock = InstanceLock::acquire(root->hostPath(kLockPath));
