@@ -36,7 +36,7 @@ class SerialQueue {
 
     /// Takes the turn for a task of the caller's if nothing runs and nothing waits, and never waits itself.
     /// True obliges the caller to `runInTurn`, once, from any thread; tasks that come meanwhile run after
-    /// that.
+    /// that, the first few of them on the same thread.
     bool tryTakeTurn();
     void runInTurn(const Task& task);
 
