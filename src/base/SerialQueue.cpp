@@ -4,15 +4,20 @@
 
 #include <algorithm>
 #include <condition_variable>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <deque>
 #include <mutex>
 #include <thread>
+#include <utility>
 #include <vector>
 
 namespace kelvo {
 namespace {
+
+/// Tasks that whoever took a turn runs behind its own, before the queue's thread is woken for the rest.
+constexpr std::size_t kMostBehindATurn = 4;
 
 /// A `sync` caller that waits for its turn.
 struct Turn {
@@ -70,7 +75,20 @@ class SerialQueue::State {
             const Running running(this);
             task();
         }
-        std::lock_guard lock(mutex_);
+        const std::lock_guard lock(mutex_);
+        passToken();
+    }
+
+    bool tryTakeTurn() {
+        const std::lock_guard lock(mutex_);
+        return !std::exchange(busy_, true);
+    }
+    void runInTurn(const Task& task) {
+        const Running running(this);
+        task();
+        std::unique_lock lock(mutex_);
+        // What came meanwhile needs no other thread to be woken for it, as long as it is little.
+        runOwnItems(lock, kMostBehindATurn);
         passToken();
     }
 
@@ -142,7 +160,7 @@ class SerialQueue::State {
                 return;
             }
             workerHasToken_ = false;
-            runOwnItems(lock);
+            runOwnItems(lock, SIZE_MAX);
             passToken();
         }
     }
@@ -150,8 +168,8 @@ class SerialQueue::State {
     /// Whether the queue's thread is to end when there is nothing to do.
     bool isLeaving() const { return finishing_ || retired_; }
 
-    void runOwnItems(std::unique_lock<std::mutex>& lock) {
-        while (!items_.empty() && items_.front().turn == nullptr) {
+    void runOwnItems(std::unique_lock<std::mutex>& lock, std::size_t most) {
+        for (std::size_t i = 0; i < most && !items_.empty() && items_.front().turn == nullptr; ++i) {
             Task task = std::move(items_.front().task);
             items_.pop_front();
             lock.unlock();
@@ -192,6 +210,13 @@ void SerialQueue::async(Task task) {
 void SerialQueue::sync(const Task& task) {
     const std::shared_ptr<State> state = state_;  // the task may let the last reference to this queue go
     state->sync(task);
+}
+bool SerialQueue::tryTakeTurn() {
+    return state_->tryTakeTurn();
+}
+void SerialQueue::runInTurn(const Task& task) {
+    const std::shared_ptr<State> state = state_;
+    state->runInTurn(task);
 }
 
 }  // namespace kelvo

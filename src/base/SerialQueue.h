@@ -34,6 +34,12 @@ class SerialQueue {
     /// queue's label.
     void sync(const Task& task);
 
+    /// Takes the turn for a task of the caller's if nothing runs and nothing waits, and never waits itself.
+    /// True obliges the caller to `runInTurn`, once, from any thread; tasks that come meanwhile run after
+    /// that, the first few of them on the same thread.
+    bool tryTakeTurn();
+    void runInTurn(const Task& task);
+
     /// Whether the calling thread runs a task of this queue now.
     bool isCurrent() const;
 

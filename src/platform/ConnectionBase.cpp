@@ -122,7 +122,7 @@ void ConnectionBase::queueHandlers(State state) {
 void ConnectionBase::enqueue(Task task) {
     gate_.with([&](Gate& gate) {
         if (gate.isOpen) {
-            queue_.async(std::move(task));
+            if (!runSoon(task)) queue_.async(std::move(task));
         } else {
             gate.held.push_back(std::move(task));
         }

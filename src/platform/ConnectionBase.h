@@ -72,6 +72,9 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     virtual void didResume() {}
     /// A message was served: `waitingCost` fell.
     virtual void didServe() {}
+    /// Runs a task of the connection's queue before this thread does anything else of its own, if the queue
+    /// is idle and the transport can spare the thread. False when not: then the task is left.
+    virtual bool runSoon(Task&) { return false; }
     /// The connection has ended: release what it holds of the system. Called once, on any thread.
     virtual void close() = 0;
     /// Nothing runs for the peer any more. Called once, on the connection's queue.

@@ -61,6 +61,14 @@ class ClientServiceContract : public testing::Test {
         listener->resume();
     }
 
+    /// What ends now is nobody's business any more: the next test records the log.
+    ~ClientServiceContract() override {
+        for (const IPCConnectionRef& each : gate->accepted.copy()) {
+            each->setInterruptionHandler(nullptr);
+            each->setInvalidationHandler(nullptr);
+        }
+    }
+
     Client connect(const ClientProgram& program) {
         const std::size_t before = gate->accepted.copy().size();
         const ConnectedProcess process = world.connectFrom(program, kService);

@@ -62,6 +62,14 @@ class SocketFixture : public testing::Test {
         listener->resume();
     }
 
+    /// What ends now is nobody's business any more: the next test records the log.
+    ~SocketFixture() override {
+        for (const IPCConnectionRef& each : gate->accepted.copy()) {
+            each->setInterruptionHandler(nullptr);
+            each->setInvalidationHandler(nullptr);
+        }
+    }
+
     Client setUp(IPCConnectionRef connection) {
         Client client;
         client.connection = std::move(connection);

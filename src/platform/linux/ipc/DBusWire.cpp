@@ -1,9 +1,10 @@
 #include "platform/IPCBounds.h"
 #include "platform/linux/ipc/DBusMessage.h"
 
-#include <bit>
+#include <array>
 #include <cerrno>
 #include <cstring>
+#include <string_view>
 
 namespace kelvo::dbus {
 namespace {
@@ -21,6 +22,8 @@ enum Field : std::uint8_t {
 };
 
 constexpr std::size_t kLongestName = 255;
+/// What most messages' headers fit into; a larger one grows.
+constexpr std::size_t kUsualHeader = 384;
 
 KVError malformed(const char* what) {
     return KVError::posix(EBADMSG, what);
@@ -54,10 +57,10 @@ class HeaderReader {
   private:
     void readField() {
         const std::uint8_t field = byte();
-        const std::string type = text(byte());
+        const std::string_view type = text(byte());
         if (type == "u") return readNumber(field);
         if (type != "s" && type != "o" && type != "g") return fail();
-        const std::string content = type == "g" ? text(byte()) : text(number());
+        const std::string_view content = type == "g" ? text(byte()) : text(number());
         if (std::string* place = placeOf(field, type)) *place = content;
     }
     void readNumber(std::uint8_t field) {
@@ -66,7 +69,7 @@ class HeaderReader {
         if (field == kDescriptors) descriptorCount_ = content;
     }
     /// Where the field goes; none for one that says nothing here, or that has a wrong type.
-    std::string* placeOf(std::uint8_t field, const std::string& type) {
+    std::string* placeOf(std::uint8_t field, std::string_view type) {
         switch (field) {
             case kPath:
                 return check(type == "o") ? &message_.path : nullptr;
@@ -93,13 +96,13 @@ class HeaderReader {
         place_ += 4;
         return read;
     }
-    std::string text(std::size_t size) {
+    std::string_view text(std::size_t size) {
         if (size > kLongestName * 4 || bytes_.size() - place_ <= size ||
             bytes_[place_ + size] != std::byte{0})
-            return fail(), std::string();
-        std::string read(reinterpret_cast<const char*>(bytes_.data() + place_), size);
+            return fail(), std::string_view();
+        const std::string_view read(reinterpret_cast<const char*>(bytes_.data() + place_), size);
         place_ += size + 1;
-        return check(read.find('\0') == std::string::npos) ? read : std::string();
+        return check(read.find('\0') == std::string_view::npos) ? read : std::string_view();
     }
     void align(std::size_t boundary) {
         while (place_ % boundary != 0 && isGood_)
@@ -121,18 +124,15 @@ class HeaderReader {
     bool isGood_ = true;
 };
 
-/// What most messages' headers fit into; a larger one grows.
-constexpr std::size_t kUsualHeader = 384;
-
 class HeaderWriter {
   public:
     explicit HeaderWriter(const Message& message) : message_(message) {}
 
     Bytes write() {
         out_.reserve(kUsualHeader + message_.body.size());
-        for (const std::uint8_t byte :
-             {std::uint8_t{'l'}, static_cast<std::uint8_t>(message_.type), message_.flags, std::uint8_t{1}})
-            put(byte);
+        const std::array<std::uint8_t, 4> head{'l', static_cast<std::uint8_t>(message_.type), message_.flags,
+                                               1};
+        append(head.data(), head.size());
         putNumber(static_cast<std::uint32_t>(message_.body.size()));
         putNumber(message_.serial);
         putNumber(0);  // the fields' length, known below
@@ -158,9 +158,7 @@ class HeaderWriter {
         } else {
             putNumber(static_cast<std::uint32_t>(text.size()));
         }
-        for (const char character : text)
-            put(static_cast<std::uint8_t>(character));
-        put(0);
+        append(text.c_str(), text.size() + 1);
     }
     void putNumberField(Field field, std::uint32_t number) {
         if (number == 0) return;
@@ -169,20 +167,18 @@ class HeaderWriter {
     }
     void begin(Field field, char type) {
         align(8);
-        for (const std::uint8_t byte : {static_cast<std::uint8_t>(field), std::uint8_t{1},
-                                        static_cast<std::uint8_t>(type), std::uint8_t{0}})
-            put(byte);
+        const std::array<std::uint8_t, 4> head{static_cast<std::uint8_t>(field), 1,
+                                               static_cast<std::uint8_t>(type), 0};
+        append(head.data(), head.size());
     }
-    void putNumber(std::uint32_t number) {
+    void putNumber(std::uint32_t number) { append(&number, sizeof(number)); }
+    void put(std::uint8_t byte) { append(&byte, 1); }
+    void append(const void* bytes, std::size_t size) {
         const std::size_t place = out_.size();
-        out_.resize(place + sizeof(number));
-        std::memcpy(out_.data() + place, &number, sizeof(number));
+        out_.resize(place + size);
+        std::memcpy(out_.data() + place, bytes, size);
     }
-    void put(std::uint8_t byte) { out_.push_back(std::byte{byte}); }
-    void align(std::size_t boundary) {
-        while (out_.size() % boundary != 0)
-            put(0);
-    }
+    void align(std::size_t boundary) { out_.resize((out_.size() + boundary - 1) / boundary * boundary); }
 
     const Message& message_;
     Bytes out_;

@@ -99,7 +99,19 @@ void SocketConnection::didServe() {
     if ((isHeldUp_ || cannotSend_) && !isPaused()) arm();
 }
 
+/// On the loop's thread itself when the queue is idle, as long as another thread is left for the sockets.
+bool SocketConnection::runSoon(Task& task) {
+    if (!loop_->mayRunAfterwards()) return false;
+    const bool isOurTurn = queue().tryTakeTurn();
+    loop_->runAfterwards(isOurTurn ? Task([self = shared_from_this(), this, runs = std::move(task)] {
+        queue().runInTurn(runs);
+    })
+                                   : nullptr);
+    return isOurTurn;
+}
+
 void SocketConnection::ready(std::uint32_t) {
+    const std::lock_guard lock(receiveMutex_);
     const Socket held = socket();
     if (!held) return;
     wasLookedAt_ = true;
@@ -124,6 +136,7 @@ void SocketConnection::noteDeadline() {
 }
 
 std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
+    const std::lock_guard lock(receiveMutex_);
     if (deadline_ && *deadline_ <= now) {
         deadline_.reset();
         cutOff(isAuthenticated_ ? "message half sent and held" : "no end of authentication");
@@ -140,17 +153,20 @@ void SocketConnection::receive(int socket) {
     constexpr int kMostRounds = 16;
     for (int round = 0; round < kMostRounds; ++round) {
         if (isPaused() || isHeldUp_ || isOver()) return;
-        if (!receiveSome(socket)) {
+        const Received received = receiveSome(socket);
+        if (received == Received::nothing) {
             // All of what the peer sent has been taken; nothing can be told to it.
             if (cannotSend_) end(State::lost);
             return;
         }
         handleReceived();
+        if (received == Received::all) return;
     }
 }
 
-/// Takes what is there, within the size of one message. False when nothing is, or the connection ended.
-bool SocketConnection::receiveSome(int socket) {
+/// Takes what is there, within the size of one message. Says `all` when nothing more was there, and `nothing`
+/// when the connection ended.
+SocketConnection::Received SocketConnection::receiveSome(int socket) {
     std::array<std::byte, 16384> buffer;
     alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int) * kMostDescriptors)> control;
     iovec part{buffer.data(), buffer.size()};
@@ -160,8 +176,8 @@ bool SocketConnection::receiveSome(int socket) {
     header.msg_control = control.data();
     header.msg_controllen = control.size();
     const ssize_t count = ::recvmsg(socket, &header, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
-    if (count < 0 && (errno == EAGAIN || errno == EINTR)) return false;
-    if (count <= 0) return end(State::lost), false;
+    if (count < 0 && (errno == EAGAIN || errno == EINTR)) return Received::nothing;
+    if (count <= 0) return end(State::lost), Received::nothing;
     for (cmsghdr* item = CMSG_FIRSTHDR(&header); item != nullptr; item = CMSG_NXTHDR(&header, item)) {
         if (item->cmsg_level != SOL_SOCKET || item->cmsg_type != SCM_RIGHTS) continue;
         for (std::size_t place = CMSG_LEN(0); place + sizeof(int) <= item->cmsg_len; place += sizeof(int)) {
@@ -171,9 +187,11 @@ bool SocketConnection::receiveSome(int socket) {
         }
     }
     if ((header.msg_flags & MSG_CTRUNC) != 0 || receivedDescriptors_.size() > kMostDescriptors * 2)
-        return cutOff("more descriptors than allowed"), false;
+        return cutOff("more descriptors than allowed"), Received::nothing;
     incoming_.insert(incoming_.end(), buffer.begin(), buffer.begin() + count);
-    return true;
+    // Descriptors end a read early, with more behind them.
+    const bool isShort = static_cast<std::size_t>(count) < buffer.size() && header.msg_controllen == 0;
+    return isShort ? Received::all : Received::some;
 }
 
 void SocketConnection::handleReceived() {

@@ -43,6 +43,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
                            ReplyIdentifier identifier) override;
     void didResume() override;
     void didServe() override;
+    bool runSoon(Task& task) override;
     void close() override;
     void didEnd() override { peer_.forget(); }
 
@@ -73,7 +74,8 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     bool maySend() const { return side_ == Side::client || isAuthenticated_; }
     void arm();
     void receive(int socket);
-    bool receiveSome(int socket);
+    enum class Received { nothing, some, all };
+    Received receiveSome(int socket);
     void noteDeadline();
     void handleReceived();
     bool authenticate();
@@ -105,7 +107,8 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     Guarded<Task> release_;
     std::atomic<SocketLoop::Token> token_{0};
 
-    // The loop's thread alone.
+    // Under `receiveMutex_`: it is one of the loop's threads at a time, but not always the same.
+    std::mutex receiveMutex_;
     Bytes incoming_;
     std::size_t messagesThisTurn_ = 0;
     std::vector<UniqueFd> receivedDescriptors_;

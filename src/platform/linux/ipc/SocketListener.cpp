@@ -116,6 +116,7 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
 
     /// Without a descriptor left a connection stays in the socket's queue and would wake the loop for ever.
     void turnAwayNext() {
+        const std::lock_guard lock(mutex_);
         spare_ = UniqueFd();
         const UniqueFd refused(::accept4(socket_.get(), nullptr, nullptr, SOCK_CLOEXEC));
         KVLogError("IPC: turned away a client: no descriptors left");

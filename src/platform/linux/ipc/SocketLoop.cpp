@@ -2,31 +2,55 @@
 
 #include "base/ThreadName.h"
 
+#include <algorithm>
 #include <array>
 #include <atomic>
 #include <sys/epoll.h>
 #include <sys/eventfd.h>
+#include <sys/timerfd.h>
+#include <utility>
 #include <vector>
 
 namespace kelvo {
 namespace {
 
+// Watchers count from here.
 constexpr SocketLoop::Token kWakeToken = 0;
+constexpr SocketLoop::Token kTimerToken = 1;
+constexpr std::size_t kMostThreads = 2;
+
+/// The loop whose thread the calling one is.
+thread_local const void* loopOfThread = nullptr;
+
+void watchOurs(int epoll, int descriptor, SocketLoop::Token token, std::uint32_t events) {
+    epoll_event event{};
+    event.events = events;
+    event.data.u64 = token;
+    ::epoll_ctl(epoll, EPOLL_CTL_ADD, descriptor, &event);
+}
 
 }  // namespace
 
-/// What the thread uses; it may outlive the loop when that goes on the thread itself.
+/// What the threads use; it may outlive the loop when that goes on one of them.
 struct SocketLoop::Shared {
-    explicit Shared(Clock itsClock) : clock(std::move(itsClock)) {}
+    explicit Shared(Clock itsClock) : clock(std::move(itsClock)) {
+        watchOurs(epoll.get(), wake.get(), kWakeToken, EPOLLIN);
+        watchOurs(epoll.get(), timer.get(), kTimerToken, EPOLLIN | EPOLLET);  // never read, wakes each time
+    }
 
     const Clock clock;
     UniqueFd epoll{::epoll_create1(EPOLL_CLOEXEC)};
     UniqueFd wake{::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)};
+    UniqueFd timer{::timerfd_create(CLOCK_MONOTONIC, TFD_CLOEXEC | TFD_NONBLOCK)};
     std::atomic<bool> isStopped{false};
     std::mutex mutex;
     std::map<Token, std::shared_ptr<SocketWatcher>> watchers;
-    Token lastToken = kWakeToken;
-    std::optional<SocketWatcher::Moment> nextTick;  // the thread's own
+    Token lastToken = kTimerToken;
+    std::mutex tickMutex;
+    std::optional<SocketWatcher::Moment> nextTick;
+    /// The thread that runs a task, or will; and the task, which is that thread's own.
+    std::atomic<std::thread::id> runner{};
+    std::function<void()> afterwards;
 
     std::shared_ptr<SocketWatcher> watcher(Token token) {
         const std::lock_guard lock(mutex);
@@ -34,16 +58,28 @@ struct SocketLoop::Shared {
         return found == watchers.end() ? nullptr : found->second;
     }
 
-    int timeout() const {
-        if (!nextTick) return -1;
-        const auto left = std::chrono::ceil<std::chrono::milliseconds>(*nextTick - clock());
-        return left.count() > 0 ? static_cast<int>(left.count()) : 0;
+    void tickAt(SocketWatcher::Moment moment) {
+        const std::lock_guard lock(tickMutex);
+        if (nextTick && *nextTick <= moment) return;
+        nextTick = moment;
+        const auto left = std::max(std::chrono::nanoseconds(moment - clock()), std::chrono::nanoseconds(1));
+        const auto seconds = std::chrono::floor<std::chrono::seconds>(left);
+        itimerspec time{};
+        time.it_value.tv_sec = seconds.count();
+        time.it_value.tv_nsec = (left - seconds).count();
+        ::timerfd_settime(timer.get(), 0, &time, nullptr);
+    }
+
+    bool isTickDue(SocketWatcher::Moment now) {
+        const std::lock_guard lock(tickMutex);
+        if (!nextTick || *nextTick > now) return false;
+        nextTick.reset();
+        return true;
     }
 
     void tickWhenDue() {
         const auto now = clock();
-        if (!nextTick || *nextTick > now) return;
-        nextTick.reset();
+        if (!isTickDue(now)) return;
         std::vector<std::shared_ptr<SocketWatcher>> all;
         {
             const std::lock_guard lock(mutex);
@@ -51,40 +87,53 @@ struct SocketLoop::Shared {
                 all.push_back(each);
         }
         for (const auto& each : all) {
-            const auto next = each->tick(now);
-            if (next && (!nextTick || *next < *nextTick)) nextTick = next;
+            if (const auto next = each->tick(now)) tickAt(*next);
         }
+    }
+
+    void runWhatIsLeft() {
+        if (runner != std::this_thread::get_id()) return;
+        if (afterwards) afterwards();
+        afterwards = nullptr;
+        runner = std::thread::id();
     }
 };
 
-SocketLoop::SocketLoop(Clock clock) : shared_(std::make_shared<Shared>(std::move(clock))) {
-    epoll_event event{};
-    event.events = EPOLLIN;
-    event.data.u64 = kWakeToken;
-    ::epoll_ctl(shared_->epoll.get(), EPOLL_CTL_ADD, shared_->wake.get(), &event);
-}
+SocketLoop::SocketLoop(Clock clock) : shared_(std::make_shared<Shared>(std::move(clock))) {}
 
 SocketLoop::~SocketLoop() {
+    stopThreads();
+}
+
+/// One that goes on a thread of its own lets that one end by itself.
+void SocketLoop::stopThreads() {
     shared_->isStopped = true;
     ::eventfd_write(shared_->wake.get(), 1);
-    if (!thread_.joinable()) return;
-    if (thread_.get_id() == std::this_thread::get_id()) {
-        thread_.detach();
-    } else {
-        thread_.join();
+    std::vector<std::thread> threads;
+    {
+        const std::lock_guard lock(startMutex_);
+        threads.swap(threads_);
+    }
+    for (std::thread& thread : threads) {
+        if (thread.get_id() == std::this_thread::get_id()) {
+            thread.detach();
+        } else {
+            thread.join();
+        }
     }
 }
 
 void SocketLoop::stop() {
-    shared_->isStopped = true;
-    ::eventfd_write(shared_->wake.get(), 1);
-    {
-        const std::lock_guard lock(startMutex_);
-        if (thread_.joinable()) thread_.join();
-    }
+    stopThreads();
     std::map<Token, std::shared_ptr<SocketWatcher>> watchers;  // destroyed after the lock is free
     const std::lock_guard lock(shared_->mutex);
     watchers.swap(shared_->watchers);
+}
+
+void SocketLoop::startThread(std::size_t count) {
+    const std::lock_guard lock(startMutex_);
+    if (threads_.size() < count && !shared_->isStopped)
+        threads_.emplace_back([shared = shared_] { run(shared); });
 }
 
 SocketLoop::Token SocketLoop::add(int descriptor, std::shared_ptr<SocketWatcher> watcher) {
@@ -98,9 +147,7 @@ SocketLoop::Token SocketLoop::add(int descriptor, std::shared_ptr<SocketWatcher>
     event.data.u64 = token;
     event.events = EPOLLONESHOT;
     ::epoll_ctl(shared_->epoll.get(), EPOLL_CTL_ADD, descriptor, &event);
-    const std::lock_guard lock(startMutex_);
-    if (!thread_.joinable() && !shared_->isStopped)
-        thread_ = std::thread([shared = shared_] { run(shared); });
+    startThread(1);
     return token;
 }
 
@@ -126,20 +173,35 @@ SocketWatcher::Moment SocketLoop::now() const {
 }
 
 void SocketLoop::tickAt(SocketWatcher::Moment moment) {
-    if (!shared_->nextTick || moment < *shared_->nextTick) shared_->nextTick = moment;
+    shared_->tickAt(moment);
+}
+
+bool SocketLoop::mayRunAfterwards() {
+    if (loopOfThread != shared_.get()) return false;
+    std::thread::id nobody;
+    if (!shared_->runner.compare_exchange_strong(nobody, std::this_thread::get_id())) return false;
+    startThread(kMostThreads);
+    return true;
+}
+
+void SocketLoop::runAfterwards(std::function<void()> task) {
+    shared_->afterwards = std::move(task);
+    if (!shared_->afterwards) shared_->runner = std::thread::id();
 }
 
 void SocketLoop::run(const std::shared_ptr<Shared>& shared) {
     nameCurrentThread("com.quillon.kelvod.sockets");
+    loopOfThread = shared.get();
     std::array<epoll_event, 32> events{};
     while (!shared->isStopped) {
-        const int count = ::epoll_wait(shared->epoll.get(), events.data(), static_cast<int>(events.size()),
-                                       shared->timeout());
+        const int count =
+            ::epoll_wait(shared->epoll.get(), events.data(), static_cast<int>(events.size()), -1);
         for (int i = 0; i < count; ++i) {
             const epoll_event& event = events[static_cast<std::size_t>(i)];
             if (const auto watcher = shared->watcher(event.data.u64)) watcher->ready(event.events);
         }
         shared->tickWhenDue();
+        shared->runWhatIsLeft();
     }
 }
 

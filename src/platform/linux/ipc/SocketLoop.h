@@ -10,6 +10,7 @@
 #include <mutex>
 #include <optional>
 #include <thread>
+#include <vector>
 
 namespace kelvo {
 
@@ -19,14 +20,18 @@ class SocketWatcher {
     using Moment = std::chrono::steady_clock::time_point;
 
     virtual ~SocketWatcher() = default;
-    /// The descriptor is ready. Nothing more is reported until it is armed again. On the loop's thread.
+    /// The descriptor is ready. Nothing more is reported until it is armed again. On a thread of the loop.
     virtual void ready(std::uint32_t events) = 0;
-    /// Called when a moment has come that was asked for; returns the next one. On the loop's thread.
+    /// Called when a moment has come that was asked for; returns the next one. On a thread of the loop.
     virtual std::optional<Moment> tick(Moment now) = 0;
 };
 
-/// The one thread that does the socket work of all connections. It starts with the first watcher, runs no
-/// request, and sleeps while nothing happens. Thread-safe.
+/// The socket work of all connections. It starts with the first watcher and sleeps while nothing happens.
+///
+/// Two threads wait for sockets. Either may go on to run what a message asks for, because waking one more
+/// thread would cost as much as the whole way of the message; but not while the other one does so: however
+/// long that takes, a thread is left for the sockets. The second one starts when it is first missed.
+/// Thread-safe.
 class SocketLoop {
   public:
     using Token = std::uint64_t;
@@ -38,7 +43,7 @@ class SocketLoop {
     SocketLoop(const SocketLoop&) = delete;
     SocketLoop& operator=(const SocketLoop&) = delete;
 
-    /// Ends the thread and lets every watcher go. Not from a watcher.
+    /// Ends the threads and lets every watcher go. Not from a watcher.
     void stop();
 
     /// Watches a descriptor, and holds the watcher until `remove`. Not armed yet.
@@ -48,16 +53,23 @@ class SocketLoop {
     /// Before the descriptor is closed.
     void remove(int descriptor, Token token);
     SocketWatcher::Moment now() const;
-    /// Ticks every watcher at `moment` or soon after. On the loop's thread.
+    /// Ticks every watcher at `moment` or soon after.
     void tickAt(SocketWatcher::Moment moment);
+
+    /// From `ready`: whether the thread may run a task once it is done with all that was ready; never on any
+    /// other thread. True obliges the caller to `runAfterwards`, with nothing if it has no task after all.
+    bool mayRunAfterwards();
+    void runAfterwards(std::function<void()> task);
 
   private:
     struct Shared;
     static void run(const std::shared_ptr<Shared>& shared);
+    void startThread(std::size_t count);
+    void stopThreads();
 
     const std::shared_ptr<Shared> shared_;
     std::mutex startMutex_;
-    std::thread thread_;
+    std::vector<std::thread> threads_;
 };
 
 }  // namespace kelvo
