@@ -51,6 +51,7 @@ bool SoundServer::hasPipeWire() {
 }
 
 bool SoundServer::start() {
+    kill();
     for (const std::string& name : {socket_, folder_.path() + "/bus", folder_.path() + "/pipewire-0"})
         std::filesystem::remove(name);
     if (kind_ == Kind::pipeWire) {
@@ -58,12 +59,10 @@ bool SoundServer::start() {
     } else {
         startPulseAudio();
     }
-    for (int attempt = 0; attempt < 100; ++attempt) {
-        if (hasDevices() && control("set-default-source mic") && control("set-default-sink speaker"))
-            return true;
-        ChildProcess({"sleep", "0.05"}).waitForExit();
-    }
-    return false;
+    const auto isReady = [this] {
+        return hasDevices() && control("set-default-source mic") && control("set-default-sink speaker");
+    };
+    return eventually(isReady, kPatience);
 }
 
 void SoundServer::startPulseAudio() {
@@ -87,8 +86,7 @@ void SoundServer::startPipeWire() {
 }
 
 void SoundServer::awaitFile(const std::string& name) const {
-    for (int attempt = 0; attempt < 100 && !std::filesystem::exists(folder_.path() + "/" + name); ++attempt)
-        ChildProcess({"sleep", "0.05"}).waitForExit();
+    eventually([&] { return std::filesystem::exists(folder_.path() + "/" + name); }, kPatience);
 }
 
 void SoundServer::run(const std::vector<std::string>& command) {
