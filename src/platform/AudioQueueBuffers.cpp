@@ -57,4 +57,9 @@ std::size_t AudioQueueBuffers::enqueuedCount() const {
     return buffers_.with([](const Buffers& buffers) { return buffers.enqueued.size(); });
 }
 
+std::size_t AudioQueueBuffers::lentCount() const {
+    return buffers_.with(
+        [](const Buffers& buffers) { return buffers.allocated.size() - buffers.enqueued.size(); });
+}
+
 }  // namespace kelvo

@@ -22,6 +22,8 @@ class AudioQueueBuffers {
     AudioQueueBufferRef takeNext();
 
     std::size_t enqueuedCount() const;
+    /// How many are with the queue's user.
+    std::size_t lentCount() const;
 
   private:
     struct Buffers {

@@ -33,31 +33,84 @@ std::string sine(int frequency) {
 
 }  // namespace
 
-SoundServer::SoundServer() : address_("unix:" + folder_.path() + "/socket") {
+SoundServer::SoundServer(Kind kind)
+    : kind_(kind), socket_(folder_.path() + (kind == Kind::pipeWire ? "/pulse/native" : "/socket")) {
+    const std::string address = "unix:" + socket_;
     // Of the environment that every part of libpulse reads, and that no thread reads at this time.
-    ::setenv("PULSE_SERVER", address_.c_str(), 1);  // NOLINT(concurrency-mt-unsafe)
-    ::setenv("HOME", folder_.path().c_str(), 1);    // NOLINT(concurrency-mt-unsafe)
+    ::setenv("PULSE_SERVER", address.c_str(), 1);  // NOLINT(concurrency-mt-unsafe)
+    ::setenv("HOME", folder_.path().c_str(), 1);   // NOLINT(concurrency-mt-unsafe)
 }
 
 SoundServer::~SoundServer() = default;
 
+bool SoundServer::hasPipeWire() {
+    return ChildProcess({"sh", "-c",
+                         "for each in pipewire pipewire-pulse wireplumber dbus-daemon; do "
+                         "command -v $each >/dev/null || exit 1; done"})
+               .waitForExit() == 0;
+}
+
 bool SoundServer::start() {
-    std::filesystem::remove(folder_.path() + "/socket");
-    server_ = std::make_unique<ChildProcess>(
-        std::vector<std::string>{
-            "pulseaudio", "-n", "--daemonize=no", "--exit-idle-time=-1", "--use-pid-file=no",
-            "--log-target=stderr", "-L",
-            "module-native-protocol-unix socket=" + folder_.path() + "/socket auth-anonymous=1", "-L",
-            "module-null-sink sink_name=speaker rate=44100 norewinds=1", "-L",
-            "module-null-sink sink_name=micfeed rate=44100 norewinds=1", "-L",
-            "module-remap-source source_name=mic master=micfeed.monitor"},
-        std::map<std::string, std::string>{{"XDG_RUNTIME_DIR", folder_.path()}});
-    return eventually([&] { return control("info"); }, kPatience) && control("set-default-source mic") &&
-           control("set-default-sink speaker");
+    kill();
+    for (const std::string& name : {socket_, folder_.path() + "/bus", folder_.path() + "/pipewire-0"})
+        std::filesystem::remove(name);
+    if (kind_ == Kind::pipeWire) {
+        startPipeWire();
+    } else {
+        startPulseAudio();
+    }
+    const auto isReady = [this] {
+        return hasDevices() && control("set-default-source mic") && control("set-default-sink speaker");
+    };
+    return eventually(isReady, kPatience);
+}
+
+void SoundServer::startPulseAudio() {
+    run({"pulseaudio", "-n", "--daemonize=no", "--exit-idle-time=-1", "--use-pid-file=no",
+         "--log-target=stderr", "-L", "module-native-protocol-unix socket=" + socket_ + " auth-anonymous=1",
+         "-L", "module-null-sink sink_name=speaker rate=44100 norewinds=1", "-L",
+         "module-null-sink sink_name=micfeed rate=44100 norewinds=1", "-L",
+         "module-remap-source source_name=mic master=micfeed.monitor"});
+}
+
+/// Its session manager, which links programs to devices, does not go without a message bus. Each waits for
+/// the one before.
+void SoundServer::startPipeWire() {
+    run({"dbus-daemon", "--session", "--nofork", "--nopidfile",
+         "--address=unix:path=" + folder_.path() + "/bus"});
+    awaitFile("bus");
+    run({"pipewire"});
+    awaitFile("pipewire-0");
+    run({"wireplumber"});
+    run({"pipewire-pulse"});
+}
+
+void SoundServer::awaitFile(const std::string& name) const {
+    eventually([&] { return std::filesystem::exists(folder_.path() + "/" + name); }, kPatience);
+}
+
+void SoundServer::run(const std::vector<std::string>& command) {
+    processes_.push_back(std::make_unique<ChildProcess>(
+        command, std::map<std::string, std::string>{
+                     {"XDG_RUNTIME_DIR", folder_.path()},
+                     {"DBUS_SESSION_BUS_ADDRESS", "unix:path=" + folder_.path() + "/bus"}}));
+}
+
+/// PipeWire's are made once it answers.
+bool SoundServer::hasDevices() const {
+    if (!control("info")) return false;
+    return kind_ == Kind::pulseAudio || answer("list short sources").find("\tmic\t") != std::string::npos ||
+           makeDevices();
+}
+
+bool SoundServer::makeDevices() const {
+    return control("load-module module-null-sink sink_name=speaker rate=44100") &&
+           control("load-module module-null-sink sink_name=micfeed rate=44100") &&
+           control("load-module module-remap-source source_name=mic master=micfeed.monitor");
 }
 
 void SoundServer::kill() {
-    server_.reset();
+    processes_.clear();
 }
 
 bool SoundServer::control(const std::string& command) const {

@@ -6,24 +6,31 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <vector>
 
 namespace kelvo::test {
 
-/// A PulseAudio server of the test's own, without hardware: a sink "speaker", and a source "mic", the default
-/// one, on which is heard what is played into the sink "micfeed". While this object lives, the process's
-/// sound is there (`PULSE_SERVER`), whether the server runs or not.
+/// A server of the PulseAudio protocol of the test's own, without hardware: a sink "speaker", and a source
+/// "mic", the default one, on which is heard what is played into the sink "micfeed". While this object lives,
+/// the process's sound is there (`PULSE_SERVER`), whether the server runs or not.
 class SoundServer {
   public:
-    SoundServer();
+    /// Whose server speaks the protocol.
+    enum class Kind { pulseAudio, pipeWire };
+
+    explicit SoundServer(Kind kind = Kind::pulseAudio);
     ~SoundServer();
     SoundServer(const SoundServer&) = delete;
     SoundServer& operator=(const SoundServer&) = delete;
+
+    /// Whether this machine has PipeWire, its PulseAudio server and its session manager.
+    static bool hasPipeWire();
 
     /// Says whether it answers.
     bool start();
     /// At once, as in a crash.
     void kill();
-    pid_t processIdentifier() const { return server_->processIdentifier(); }
+    pid_t processIdentifier() const { return processes_.front()->processIdentifier(); }
 
     /// A command such as "set-default-source mic"; says whether it succeeded.
     bool control(const std::string& command) const;
@@ -36,9 +43,17 @@ class SoundServer {
                                        std::optional<int> process = std::nullopt) const;
 
   private:
+    void startPulseAudio();
+    void startPipeWire();
+    void run(const std::vector<std::string>& command);
+    void awaitFile(const std::string& name) const;
+    bool hasDevices() const;
+    bool makeDevices() const;
+
+    const Kind kind_;
     const TemporaryDirectory folder_;
-    const std::string address_;
-    std::unique_ptr<ChildProcess> server_;
+    const std::string socket_;
+    std::vector<std::unique_ptr<ChildProcess>> processes_;
 };
 
 }  // namespace kelvo::test

@@ -72,6 +72,14 @@ TEST_F(ApplicationTapTest, QuietProcessYieldsSilenceOnTime) {
         ASSERT_EQ(sample, 0);
 }
 
+TEST_F(ApplicationTapTest, BuffersLastUntilAFirstFrameThatComesLate) {
+    manager->startAppAudioCaptureForProcessID(kProcess, appAudio.collector(), nullptr);
+    std::this_thread::sleep_for(1500ms);  // each of the ten is dropped that is full meanwhile
+    EXPECT_TRUE(appAudio.all().empty());
+    manager->setCaptureStartTime(MediaTime::make(0, 1));
+    EXPECT_FALSE(appAudio.next(0.5).empty());
+}
+
 TEST_F(ApplicationTapTest, TapFollowsTheClockWhileStreamsComeAndGo) {
     startTap();
     for (int i = 0; i < 3; ++i) {

@@ -81,13 +81,13 @@ TEST_F(SoundServerLossTest, StartsAndStopsDeliverNothingLate) {
         ++calls;
         if (!mayBeCalled) ++lateCalls;
     };
-    for (int i = 0; i < 250; ++i) {
+    for (int i = 0; i < 500; ++i) {
         mayBeCalled = true;
         manager->setCaptureStartTime(MediaTime::make(0, 1));
         manager->startMicrophoneCaptureWithOutput(output, nullptr);
         manager->startAppAudioCaptureForProcessID(kProcess, output, nullptr);
         // From none at all to long enough for sound to come.
-        std::this_thread::sleep_for(std::chrono::milliseconds(i % 25 == 0 ? 200 : i % 10));
+        std::this_thread::sleep_for(std::chrono::milliseconds(i % 50 == 0 ? 200 : i % 10));
         if (i % 2 == 0) manager->stopMicrophoneCapture();
         manager->stopAllCapture();
         mayBeCalled = false;

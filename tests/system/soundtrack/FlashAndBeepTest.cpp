@@ -12,10 +12,10 @@ class FlashAndBeepTest : public SoundtrackFixture {
 
     /// Two processes that do nothing but compute.
     static std::vector<std::unique_ptr<ChildProcess>> busyProcesses() {
-        std::vector<std::unique_ptr<ChildProcess>> processes;
-        for (int i = 0; i < 2; ++i)
-            processes.push_back(
-                std::make_unique<ChildProcess>(std::vector<std::string>{"sh", "-c", "while :; do :; done"}));
+        const std::vector<std::string> command{"sh", "-c", "while :; do :; done"};
+        std::vector<std::unique_ptr<ChildProcess>> processes(2);
+        for (auto& process : processes)
+            process = std::make_unique<ChildProcess>(command);
         return processes;
     }
 

@@ -8,7 +8,7 @@
 namespace kelvo::pulse {
 namespace {
 
-constexpr std::chrono::milliseconds kTickInterval{40};
+constexpr std::chrono::milliseconds kTickInterval{20};
 
 std::uint32_t rateOf(const AudioFormatRecord& format) {
     return static_cast<std::uint32_t>(format.sampleRate);
@@ -135,18 +135,27 @@ void PulseInputQueue::runningChanged() const {
 }
 
 void PulseInputQueue::fillBuffers(MixTimeline& timeline) {
-    while (timeline.readableFrames(clock_->monotonicNow()) >= kFramesInBuffer) {
+    std::int64_t frames = framesInNextBuffer();
+    while (timeline.readableFrames(clock_->monotonicNow()) >= frames) {
         if (const AudioQueueBufferRef buffer = buffers_.takeNext()) {
-            fill(timeline, buffer);
+            fill(timeline, buffer, frames);
         } else {
             timeline.read(lost_, isBigEndian(format_));
         }
+        frames = framesInNextBuffer();
     }
 }
 
-void PulseInputQueue::fill(MixTimeline& timeline, const AudioQueueBufferRef& buffer) {
-    const auto frames =
-        std::min(kFramesInBuffer, static_cast<std::int64_t>(buffer->bytes.size() / format_.bytesPerFrame));
+std::int64_t PulseInputQueue::framesInNextBuffer() const {
+    if (buffers_.enqueuedCount() == 0) return kFramesInBuffer;
+    std::int64_t frames = kFramesInBuffer;
+    for (std::size_t i = buffers_.lentCount(); i > 0 && frames < kMostFramesInBuffer; --i)
+        frames *= 2;
+    return std::min(frames, kMostFramesInBuffer);
+}
+
+void PulseInputQueue::fill(MixTimeline& timeline, const AudioQueueBufferRef& buffer, std::int64_t frames) {
+    frames = std::min(frames, static_cast<std::int64_t>(buffer->bytes.size() / format_.bytesPerFrame));
     AudioTimeStamp start;
     start.sampleTime = static_cast<double>(timeline.framesRead());
     start.hostTime = static_cast<std::uint64_t>(timeline.position().count());

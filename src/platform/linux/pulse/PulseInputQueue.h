@@ -17,9 +17,10 @@ class PulseInputQueue : public AudioInputQueue {
   public:
     using ServerSource = std::function<std::shared_ptr<PulseServer>()>;
 
-    /// Frames in a filled buffer, at most: about 93 ms, so that little sound is on its way when a recording
-    /// ends.
-    static constexpr std::int64_t kFramesInBuffer = 4096;
+    /// Frames in a filled buffer: about 46 ms, so that little sound is on its way when a recording ends; but
+    /// twice as many for each buffer that its user keeps, so that those that are left last the longer.
+    static constexpr std::int64_t kFramesInBuffer = 2048;
+    static constexpr std::int64_t kMostFramesInBuffer = 14 * kFramesInBuffer;
 
     /// Whether buffers of `format` can be filled.
     static bool isSupported(const AudioFormatRecord& format);
@@ -51,7 +52,8 @@ class PulseInputQueue : public AudioInputQueue {
 
     void endRun();
     void fillBuffers(MixTimeline& timeline);
-    void fill(MixTimeline& timeline, const AudioQueueBufferRef& buffer);
+    std::int64_t framesInNextBuffer() const;
+    void fill(MixTimeline& timeline, const AudioQueueBufferRef& buffer, std::int64_t frames);
     OptionalError unlessDisposed(const char* operation) const;
     void runningChanged() const;
 

@@ -7,7 +7,7 @@
 namespace kelvo::pulse {
 namespace {
 
-constexpr std::chrono::milliseconds kDeliveryInterval{40};
+constexpr std::chrono::milliseconds kDeliveryInterval{20};
 
 }  // namespace
 
