@@ -259,7 +259,7 @@ class SessionFixture : public testing::Test {
         session->setSystemRecording(true);
     }
     std::shared_ptr<FakeExtensionLink> broadcast(BroadcastProcessMode mode) {
-        const auto link = std::make_shared<FakeExtensionLink>();
+        auto link = std::make_shared<FakeExtensionLink>();
         session->setBroadcastExtension(link);
         session->setBroadcastProcessMode(mode);
         session->setBroadcasting(true);

@@ -32,11 +32,19 @@ class FrozenServerTest : public testing::Test {
     }
 
     const std::string& display() const { return server_.display(); }
+    void startSource() {
+        screen_.setMode(MirroringMode::wholeScreen);
+        source_->setDelegate(recorder_);
+        source_->startCapture();
+    }
 
     std::chrono::steady_clock::time_point begin_ = std::chrono::steady_clock::now();
     test::XvfbServer server_{200, 160};
     test::XClient client_{server_.display()};
     xcb_window_t window_ = client_.createWindow({0, 0, 100, 100}, 0);
+    X11Screen screen_{server_.display()};
+    std::shared_ptr<test::FrameRecorder> recorder_ = std::make_shared<test::FrameRecorder>();
+    std::shared_ptr<ScreenCaptureSource> source_ = screen_.createSource({200, 160}, MediaTime::make(1, 60));
 };
 
 TEST_F(FrozenServerTest, OrientationIsUnknownUntilItGoesOn) {
@@ -46,47 +54,32 @@ TEST_F(FrozenServerTest, OrientationIsUnknownUntilItGoesOn) {
 }
 
 TEST_F(FrozenServerTest, SourceStartedMeanwhileStops) {
-    X11Screen screen(display());
-    screen.setMode(MirroringMode::wholeScreen);
-    const auto recorder = std::make_shared<test::FrameRecorder>();
-    const auto source = screen.createSource({200, 160}, MediaTime::make(1, 60));
-    source->setDelegate(recorder);
-    source->startCapture();
+    startSource();
     std::this_thread::sleep_for(50ms);
-    source->stopCapture();
-    EXPECT_TRUE(recorder->failures().empty());
-    EXPECT_EQ(recorder->count(), 0U);
+    source_->stopCapture();
+    EXPECT_TRUE(recorder_->failures().empty());
+    EXPECT_EQ(recorder_->count(), 0U);
 }
 
 TEST_F(FrozenServerTest, SourceStartedMeanwhileDeliversOnceItGoesOn) {
-    X11Screen screen(display());
-    screen.setMode(MirroringMode::wholeScreen);
-    const auto recorder = std::make_shared<test::FrameRecorder>();
-    const auto source = screen.createSource({200, 160}, MediaTime::make(1, 60));
-    source->setDelegate(recorder);
-    source->startCapture();
+    startSource();
     std::this_thread::sleep_for(50ms);
     server_.thaw();
-    EXPECT_TRUE(eventually([&] { return recorder->count() > 0; }));
-    EXPECT_TRUE(recorder->failures().empty());
-    source->stopCapture();
+    EXPECT_TRUE(eventually([&] { return recorder_->count() > 0; }));
+    EXPECT_TRUE(recorder_->failures().empty());
+    source_->stopCapture();
 }
 
 TEST_F(FrozenServerTest, SourceFollowsNoMirroringButStops) {
     server_.thaw();
-    X11Screen screen(display());
-    screen.setMode(MirroringMode::wholeScreen);
-    const auto recorder = std::make_shared<test::FrameRecorder>();
-    const auto source = screen.createSource({200, 160}, MediaTime::make(1, 60));
-    source->setDelegate(recorder);
-    source->startCapture();
-    ASSERT_TRUE(eventually([&] { return recorder->count() > 0; }));
+    startSource();
+    ASSERT_TRUE(eventually([&] { return recorder_->count() > 0; }));
     server_.freeze();
-    screen.setCloneContexts({window_});
-    screen.setMode(MirroringMode::cloneContexts);
+    screen_.setCloneContexts({window_});
+    screen_.setMode(MirroringMode::cloneContexts);
     std::this_thread::sleep_for(50ms);
-    source->stopCapture();
-    EXPECT_TRUE(recorder->failures().empty());
+    source_->stopCapture();
+    EXPECT_TRUE(recorder_->failures().empty());
 }
 
 TEST_F(FrozenServerTest, RenderServerTellsNothingUntilItGoesOn) {
