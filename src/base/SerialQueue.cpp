@@ -57,10 +57,13 @@ class SerialQueue::State {
     }
 
     void async(Task task, const std::shared_ptr<State>& self) {
-        std::lock_guard lock(mutex_);
+        std::unique_lock lock(mutex_);
         items_.push_back({std::move(task), nullptr});
         if (!worker_.joinable()) worker_ = std::thread([self] { self->work(); });
-        if (!busy_) passToken();
+        const bool isForWorker = !busy_ && passToken();
+        lock.unlock();
+        // A worker that wakes while the lock is held would only sleep again.
+        if (isForWorker) workerWakes_.notify_one();
     }
 
     void sync(const Task& task) {
@@ -70,8 +73,10 @@ class SerialQueue::State {
             const Running running(this);
             task();
         }
-        std::lock_guard lock(mutex_);
-        passToken();
+        std::unique_lock lock(mutex_);
+        const bool isForWorker = passToken();
+        lock.unlock();
+        if (isForWorker) workerWakes_.notify_one();
     }
 
     void finish() {
@@ -108,21 +113,19 @@ class SerialQueue::State {
         turn.granted.wait(lock, [&turn] { return turn.isGranted; });
     }
 
-    /// Under the lock, by the holder of the token (or by anyone while nobody holds it).
-    void passToken() {
+    /// Under the lock, by the holder of the token (or by anyone while nobody holds it). Says whether the
+    /// worker has something to do.
+    bool passToken() {
         busy_ = !items_.empty();
-        if (!busy_) {
-            if (finishing_) workerWakes_.notify_one();  // a `sync` task let the queue go: nothing follows it
-            return;
-        }
+        if (!busy_) return finishing_;  // a `sync` task let the queue go: nothing follows it
         if (Turn* turn = items_.front().turn; turn != nullptr) {
             items_.pop_front();
             turn->isGranted = true;
             turn->granted.notify_one();
-        } else {
-            workerHasToken_ = true;
-            workerWakes_.notify_one();
+            return false;
         }
+        workerHasToken_ = true;
+        return true;
     }
 
     void work() {
@@ -134,7 +137,7 @@ class SerialQueue::State {
             if (!workerHasToken_) return;
             workerHasToken_ = false;
             runOwnItems(lock);
-            passToken();
+            static_cast<void>(passToken());  // if it is this thread's again, the wait ends at once
         }
     }
 
