@@ -79,6 +79,12 @@ class SerialQueue::State {
         if (isForWorker) workerWakes_.notify_one();
     }
 
+    void retire() {
+        std::lock_guard lock(mutex_);
+        retired_ = true;
+        workerWakes_.notify_one();
+    }
+
     void finish() {
         std::thread worker;
         {
@@ -117,7 +123,7 @@ class SerialQueue::State {
     /// worker has something to do.
     bool passToken() {
         busy_ = !items_.empty();
-        if (!busy_) return finishing_;  // a `sync` task let the queue go: nothing follows it
+        if (!busy_) return isLeaving();  // a `sync` task let the queue go: nothing follows it
         if (Turn* turn = items_.front().turn; turn != nullptr) {
             items_.pop_front();
             turn->isGranted = true;
@@ -133,13 +139,19 @@ class SerialQueue::State {
         const Running running(this);
         std::unique_lock lock(mutex_);
         while (true) {
-            workerWakes_.wait(lock, [this] { return workerHasToken_ || (finishing_ && !busy_); });
-            if (!workerHasToken_) return;
+            workerWakes_.wait(lock, [this] { return workerHasToken_ || (isLeaving() && !busy_); });
+            if (!workerHasToken_) {
+                if (worker_.joinable()) worker_.detach();  // nobody waits for it; the state lives on with it
+                return;
+            }
             workerHasToken_ = false;
             runOwnItems(lock);
             static_cast<void>(passToken());  // if it is this thread's again, the wait ends at once
         }
     }
+
+    /// Whether the queue's thread is to end when there is nothing to do.
+    bool isLeaving() const { return finishing_ || retired_; }
 
     void runOwnItems(std::unique_lock<std::mutex>& lock) {
         while (!items_.empty() && items_.front().turn == nullptr) {
@@ -160,6 +172,7 @@ class SerialQueue::State {
     bool busy_ = false;
     bool workerHasToken_ = false;
     bool finishing_ = false;
+    bool retired_ = false;
 };
 
 SerialQueue::SerialQueue(std::string label) : state_(std::make_shared<State>(std::move(label))) {}
@@ -172,6 +185,9 @@ const std::string& SerialQueue::label() const {
 }
 bool SerialQueue::isCurrent() const {
     return state_->isCurrent();
+}
+void SerialQueue::retire() {
+    state_->retire();
 }
 void SerialQueue::async(Task task) {
     state_->async(std::move(task), state_);

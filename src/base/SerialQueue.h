@@ -37,6 +37,10 @@ class SerialQueue {
     /// Whether the calling thread runs a task of this queue now.
     bool isCurrent() const;
 
+    /// Little or nothing will be queued from now on: the queue's thread ends whenever there is nothing to do,
+    /// and a later `async` task starts another.
+    void retire();
+
   private:
     class State;
     std::shared_ptr<State> state_;

@@ -231,6 +231,9 @@ void ConnectionBase::runHandlers(State state) {
     for (const auto& [identifier, awaited] : awaitedReplies_.exchange({})) {
         if (awaited.errorHandler) awaited.errorHandler(connectionOver());
     }
+    didEnd();
+    // Somebody may hold the connection for long.
+    queue_.retire();
 }
 
 }  // namespace kelvo

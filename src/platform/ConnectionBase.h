@@ -74,6 +74,8 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     virtual void didServe() {}
     /// The connection has ended: release what it holds of the system. Called once, on any thread.
     virtual void close() = 0;
+    /// Nothing runs for the peer any more. Called once, on the connection's queue.
+    virtual void didEnd() {}
 
     /// What runs on the connection's queue. Held back until the connection is resumed.
     void enqueue(Task task);

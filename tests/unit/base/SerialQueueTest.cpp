@@ -1,5 +1,6 @@
 #include "base/Guarded.h"
 #include "base/SerialQueue.h"
+#include "support/Eventually.h"
 #include "support/Threads.h"
 
 #include <algorithm>
@@ -276,6 +277,41 @@ TEST_F(SerialQueueDeathTest, SyncOntoItselfThroughAnotherQueuesSyncAborts) {
             queue.sync([] {});
         },
         "com\\.quillon\\.outer");
+}
+
+TEST(SerialQueueTest, RetiredQueueKeepsNoThreadAndStillRunsTasks) {
+    SerialQueue queue("test.retired");
+    std::weak_ptr<int> alive;
+    const auto leavesAThread = [&] {
+        // Ends with the thread that made it.
+        queue.async([&alive] {
+            thread_local std::shared_ptr<int> ofThread;
+            ofThread = std::make_shared<int>();
+            alive = ofThread;
+        });
+        queue.sync([] {});
+        return !test::eventually([&] { return alive.expired(); }, std::chrono::milliseconds(100));
+    };
+    EXPECT_TRUE(leavesAThread());
+    queue.retire();
+    EXPECT_TRUE(test::eventually([&] { return alive.expired(); }));
+    for (int i = 0; i < 3; ++i) {
+        bool hasRun = false;
+        queue.async([&] { hasRun = true; });
+        queue.sync([] {});
+        EXPECT_TRUE(hasRun);
+    }
+}
+
+TEST(SerialQueueTest, QueueRetiresInItsOwnTaskAndGoes) {
+    auto queue = std::make_unique<SerialQueue>("test.retired");
+    std::promise<void> hasRun;
+    queue->async([&] {
+        queue->retire();
+        hasRun.set_value();
+    });
+    hasRun.get_future().wait();
+    queue.reset();
 }
 
 }  // namespace

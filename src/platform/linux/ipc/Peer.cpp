@@ -26,13 +26,15 @@ Peer::Peer(int socket, std::shared_ptr<BundleService> bundles) : bundles_(std::m
     if (::getsockopt(socket, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0) return;
     processIdentifier_ = credentials.pid;
     user_ = credentials.uid;
-    process_ = openProcess(socket, processIdentifier_);
+    process_.set(std::make_shared<const UniqueFd>(openProcess(socket, processIdentifier_)));
 }
 
 /// A process that has ended makes its descriptor readable.
 bool Peer::isAlive() const {
-    pollfd process{process_.get(), POLLIN, 0};
-    return process_ && ::poll(&process, 1, 0) == 0;
+    const auto held = process_.copy();
+    if (!held || !*held) return false;
+    pollfd process{held->get(), POLLIN, 0};
+    return ::poll(&process, 1, 0) == 0;
 }
 
 Value Peer::entitlement(std::string_view name) const {

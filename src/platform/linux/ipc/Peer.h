@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/Guarded.h"
 #include "base/UniqueFd.h"
 #include "platform/Bundles.h"
 
@@ -23,12 +24,15 @@ class Peer {
     /// number may be somebody else's by now.
     Value entitlement(std::string_view name) const;
 
+    /// Gives up what it holds of the process, which has no rights from now on.
+    void forget() { process_.set(nullptr); }
+
   private:
     bool isAlive() const;
 
     std::int32_t processIdentifier_ = 0;
     uid_t user_ = static_cast<uid_t>(-1);
-    UniqueFd process_;
+    Guarded<std::shared_ptr<const UniqueFd>> process_;
     std::shared_ptr<BundleService> bundles_;
 };
 

@@ -44,6 +44,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     void didResume() override;
     void didServe() override;
     void close() override;
+    void didEnd() override { peer_.forget(); }
 
   private:
     /// A message on its way out: what is left of its bytes, and its descriptors until the first byte is gone.
@@ -99,13 +100,14 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     const Side side_;
     Guarded<Socket> socket_;
     const std::shared_ptr<SocketLoop> loop_;
-    const Peer peer_;
+    Peer peer_;
     const std::shared_ptr<const DeviceRoot> root_;
     Guarded<Task> release_;
     std::atomic<SocketLoop::Token> token_{0};
 
     // The loop's thread alone.
     Bytes incoming_;
+    std::size_t messagesThisTurn_ = 0;
     std::vector<UniqueFd> receivedDescriptors_;
     std::optional<dbus::ServerAuthentication> authentication_;
     std::optional<Moment> deadline_;
