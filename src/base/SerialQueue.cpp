@@ -57,13 +57,10 @@ class SerialQueue::State {
     }
 
     void async(Task task, const std::shared_ptr<State>& self) {
-        std::unique_lock lock(mutex_);
+        std::lock_guard lock(mutex_);
         items_.push_back({std::move(task), nullptr});
         if (!worker_.joinable()) worker_ = std::thread([self] { self->work(); });
-        const bool isForWorker = !busy_ && passToken();
-        lock.unlock();
-        // A worker that wakes while the lock is held would only sleep again.
-        if (isForWorker) workerWakes_.notify_one();
+        if (!busy_) passToken();
     }
 
     void sync(const Task& task) {
@@ -73,10 +70,8 @@ class SerialQueue::State {
             const Running running(this);
             task();
         }
-        std::unique_lock lock(mutex_);
-        const bool isForWorker = passToken();
-        lock.unlock();
-        if (isForWorker) workerWakes_.notify_one();
+        std::lock_guard lock(mutex_);
+        passToken();
     }
 
     void retire() {
@@ -119,19 +114,21 @@ class SerialQueue::State {
         turn.granted.wait(lock, [&turn] { return turn.isGranted; });
     }
 
-    /// Under the lock, by the holder of the token (or by anyone while nobody holds it). Says whether the
-    /// worker has something to do.
-    bool passToken() {
+    /// Under the lock, by the holder of the token (or by anyone while nobody holds it).
+    void passToken() {
         busy_ = !items_.empty();
-        if (!busy_) return isLeaving();  // a `sync` task let the queue go: nothing follows it
+        if (!busy_) {
+            if (isLeaving()) workerWakes_.notify_one();  // a `sync` task let the queue go: nothing follows it
+            return;
+        }
         if (Turn* turn = items_.front().turn; turn != nullptr) {
             items_.pop_front();
             turn->isGranted = true;
             turn->granted.notify_one();
-            return false;
+        } else {
+            workerHasToken_ = true;
+            workerWakes_.notify_one();
         }
-        workerHasToken_ = true;
-        return true;
     }
 
     void work() {
@@ -146,7 +143,7 @@ class SerialQueue::State {
             }
             workerHasToken_ = false;
             runOwnItems(lock);
-            static_cast<void>(passToken());  // if it is this thread's again, the wait ends at once
+            passToken();
         }
     }
 

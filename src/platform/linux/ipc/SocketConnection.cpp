@@ -15,12 +15,6 @@ namespace kelvo {
 
 using namespace ipc_bounds;
 
-namespace {
-
-constexpr std::size_t kReceivedAtOnce = 16384;
-
-}  // namespace
-
 SocketConnection::SocketConnection(Side side, UniqueFd socket, std::shared_ptr<SocketLoop> loop,
                                    std::shared_ptr<BundleService> bundles,
                                    std::shared_ptr<const DeviceRoot> root, Task release)
@@ -146,21 +140,18 @@ void SocketConnection::receive(int socket) {
     constexpr int kMostRounds = 16;
     for (int round = 0; round < kMostRounds; ++round) {
         if (isPaused() || isHeldUp_ || isOver()) return;
-        const std::size_t before = incoming_.size();
         if (!receiveSome(socket)) {
             // All of what the peer sent has been taken; nothing can be told to it.
             if (cannotSend_) end(State::lost);
             return;
         }
-        const bool isProbablyAll = incoming_.size() - before < kReceivedAtOnce && !cannotSend_;
         handleReceived();
-        if (isProbablyAll) return;  // if not, the loop comes back at once
     }
 }
 
 /// Takes what is there, within the size of one message. False when nothing is, or the connection ended.
 bool SocketConnection::receiveSome(int socket) {
-    std::array<std::byte, kReceivedAtOnce> buffer;
+    std::array<std::byte, 16384> buffer;
     alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int) * kMostDescriptors)> control;
     iovec part{buffer.data(), buffer.size()};
     msghdr header{};
