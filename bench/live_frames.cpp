@@ -18,6 +18,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <functional>
+#include <future>
 #include <kelvokit/KelvoKit.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
@@ -31,6 +32,8 @@ using namespace kelvo;
 using Clock = std::chrono::steady_clock;
 
 constexpr std::chrono::nanoseconds kInterval{16'666'667};
+/// Ten times as often: shows how much of the cost is waking up sleeping threads and cold caches.
+constexpr std::chrono::nanoseconds kShortInterval = kInterval / 10;
 constexpr int kWarmUp = 60;
 constexpr int kFrames = 900;
 constexpr double kBoundMicroseconds = 60;
@@ -73,13 +76,13 @@ class Meter {
     std::vector<std::int64_t> ages_;
 };
 
-/// Runs `frame` 60 times a second; the processor time of each after the first ones, in microseconds.
-double play(const std::function<bool()>& frame) {
+/// Runs `frame` at every `interval`; the processor time of each after the first ones, in microseconds.
+double play(std::chrono::nanoseconds interval, const std::function<bool()>& frame) {
     auto next = Clock::now();
     double before = 0;
     for (int i = 0; i < kWarmUp + kFrames; ++i) {
         if (i == kWarmUp) before = test::processorSeconds();
-        std::this_thread::sleep_until(next += kInterval);
+        std::this_thread::sleep_until(next += interval);
         if (!frame()) std::fprintf(stderr, "frame %d was skipped\n", i);
     }
     return (test::processorSeconds() - before) / kFrames * 1e6;
@@ -88,16 +91,18 @@ double play(const std::function<bool()>& frame) {
 /// An application that captures itself and looks at nothing.
 Report application(const std::string& socket) {
     Meter meter;
+    std::promise<void> done;
     kelvokit::Recorder recorder({.socketPath = socket, .executor = nullptr});
-    recorder.onFrame([&](const kelvokit::Frame& frame) { meter.frame(frame.presentationTime()->count()); });
+    recorder.onFrame([&](const kelvokit::Frame& frame) {
+        meter.frame(frame.presentationTime()->count());
+        if (meter.isDone()) done.set_value();
+    });
     while (!recorder.state().isConnected) {
         recorder.refreshState();
         std::this_thread::sleep_for(std::chrono::milliseconds(20));
     }
-    for (int i = 0; i < 3000 && !meter.isDone(); ++i)
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    std::this_thread::sleep_for(std::chrono::milliseconds(100));
-    return meter.isDone() ? meter.report() : Report();
+    const bool isDone = done.get_future().wait_for(std::chrono::seconds(60)) == std::future_status::ready;
+    return isDone ? meter.report() : Report();
 }
 
 Report bareReader(int socket) {
@@ -154,7 +159,7 @@ struct Nowhere : LogSink {
     void write(LogLevel, std::string_view) override {}
 };
 
-std::pair<double, Report> measureCapture() {
+std::pair<double, Report> measureCapture(std::chrono::nanoseconds interval) {
     const test::TemporaryDirectory root;
     const Other client([&] { return application(root.path() + "/run/kelvod/com.quillon.kelvod"); });
     setLogSink(std::make_shared<Nowhere>());
@@ -168,7 +173,7 @@ std::pair<double, Report> measureCapture() {
     std::this_thread::sleep_for(std::chrono::milliseconds(200));
     KVClientProxy proxy(door->client.copy());
     VideoSurfacePool pool(VideoSurface::Geometry::packed(1080, 1920), 8);
-    const double processor = play([&] {
+    const double processor = play(interval, [&] {
         const auto surface = pool.take();
         if (!surface) return false;
         const auto object = std::make_shared<KVIOSurfaceObject>();
@@ -190,7 +195,7 @@ std::pair<double, Report> measureBare() {
         for (int i = 0; i < kWarmUp + kFrames && ::recv(ends[0], &byte, 1, 0) == 1; ++i) {
         }
     });
-    const double processor = play([&] {
+    const double processor = play(kInterval, [&] {
         const std::int64_t sentAt = now();
         return ::send(ends[0], &sentAt, sizeof(sentAt), MSG_NOSIGNAL) == sizeof(sentAt);
     });
@@ -208,11 +213,18 @@ void print(const char* name, double sender, const Report& receiver) {
 }  // namespace
 
 int main() {
-    const auto [bareSender, bareReceiver] = measureBare();
+    // What it takes to wake up 60 times a second, which a capture does anyway.
+    const double rhythm = play(kInterval, [] { return true; });
+    std::printf("rhythm    %6.1f us a frame, taken off the senders\n", rhythm);
+    const auto [bareWhole, bareReceiver] = measureBare();
+    const double bareSender = bareWhole - rhythm;
     print("bare", bareSender, bareReceiver);
-    const auto [sender, receiver] = measureCapture();
+    const auto [whole, receiver] = measureCapture(kInterval);
+    const double sender = whole - rhythm;
     if (receiver.frames == 0) return std::puts("not every frame arrived"), 1;
     print("KelvoKit", sender, receiver);
+    const auto [often, oftenReceiver] = measureCapture(kShortInterval);
+    print("10x often", often - play(kShortInterval, [] { return true; }), oftenReceiver);
     const double cost = sender + receiver.processor;
     std::printf(
         "processor %.1f us a frame (bound %.0f), %.2f times the bare hand-over; 99th percentile %.3f ms "

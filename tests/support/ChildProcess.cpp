@@ -52,7 +52,7 @@ ChildProcess::~ChildProcess() {
 }
 
 void ChildProcess::signal(int number) const {
-    ::kill(processIdentifier_, number);
+    if (processIdentifier_ > 0) ::kill(processIdentifier_, number);  // -1 would be everybody
 }
 
 bool ChildProcess::readMore(Deadline deadline) {
@@ -80,7 +80,7 @@ std::optional<int> ChildProcess::waitForExit() {
     const Deadline deadline = patienceEnds();
     while (readMore(deadline)) {
     }
-    if (std::chrono::steady_clock::now() >= deadline) return std::nullopt;
+    if (std::chrono::steady_clock::now() >= deadline || processIdentifier_ < 0) return std::nullopt;
     int status = 0;
     ::waitpid(processIdentifier_, &status, 0);
     processIdentifier_ = -1;

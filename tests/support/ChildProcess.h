@@ -32,7 +32,7 @@ class ChildProcess {
     void signal(int number) const;
 
     /// Waits for the end, reading standard error meanwhile; the exit status, or none when a signal ended it
-    /// or ten seconds pass first.
+    /// or ten seconds pass first. Once there was an end, none.
     std::optional<int> waitForExit();
 
   private:

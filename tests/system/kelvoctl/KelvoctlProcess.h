@@ -16,11 +16,19 @@ class KelvoctlProcess : public ChildProcess {
         : ChildProcess(command(program, arguments, "exec \"$0\" \"$@\" 1>&2"), environment(socket, display)) {
     }
 
+    /// The exit status, or none when it does not end within a minute: mixing takes a while on a busy machine.
+    std::optional<int> waitForEnd() {
+        std::optional<int> status;
+        for (int attempt = 0; attempt < 6 && !status; ++attempt)
+            status = waitForExit();
+        return status;
+    }
+
     /// The exit status of a command that ends by itself, and what it printed on both outputs.
     static std::pair<int, std::string> run(const std::string& socket,
                                            const std::vector<std::string>& arguments) {
         KelvoctlProcess process(socket, arguments);
-        const int status = process.waitForExit().value_or(-1);
+        const int status = process.waitForEnd().value_or(-1);
         return {status, process.output()};
     }
 

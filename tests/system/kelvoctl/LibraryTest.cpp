@@ -47,7 +47,7 @@ TEST_F(LibraryCommandTest, EmptyLibraryAndStoreAreSaid) {
 TEST_F(LibraryCommandTest, SavedMovieIsListedWithItsFile) {
     KelvoctlProcess recording(world.socket(), {"record", "--seconds", "1"}, KELVOCTL_PROGRAM,
                               world.display());
-    ASSERT_EQ(recording.waitForExit(), 0) << recording.output() << world.log();
+    ASSERT_EQ(recording.waitForEnd(), 0) << recording.output() << world.log();
     ASSERT_EQ(world.library().size(), 1U);
     const std::string path = world.library().front();
     const auto [status, text] = run({"library"});

@@ -90,13 +90,6 @@ class RecordingTest : public testing::Test {
         return std::make_unique<KelvoctlProcess>(world.socket(), arguments, KELVOCTL_PROGRAM,
                                                  world.display());
     }
-    /// Mixing takes a while on a busy machine.
-    static std::optional<int> end(KelvoctlProcess& process) {
-        for (int attempt = 0; attempt < 5; ++attempt) {
-            if (const auto status = process.waitForExit()) return status;
-        }
-        return std::nullopt;
-    }
     std::pair<int, std::string> run(const std::vector<std::string>& arguments) {
         return KelvoctlProcess::run(world.socket(), arguments);
     }
@@ -125,7 +118,7 @@ class RecordingTest : public testing::Test {
 TEST_F(RecordingTest, ScreenAndBothSoundsAreInTheSavedMovie) {
     playTones();
     const auto recording = begin({"--seconds", "4", "--microphone"});
-    EXPECT_EQ(end(*recording), 0) << recording->output() << world.log();
+    EXPECT_EQ(recording->waitForEnd(), 0) << recording->output() << world.log();
     EXPECT_NE(recording->output().find("saved 4."), std::string::npos) << recording->output();
     const std::string movie = savedMovie();
     expectWhole(movie, 1, 15);
@@ -143,7 +136,7 @@ TEST_F(RecordingTest, OutputKeepsTheSoundsApartAndLeavesTheLibraryEmpty) {
     playTones();
     const std::string movie = world.root() + "/talk.mp4";
     const auto recording = begin({"--seconds", "4", "--microphone", "--output", movie});
-    EXPECT_EQ(end(*recording), 0) << recording->output() << world.log();
+    EXPECT_EQ(recording->waitForEnd(), 0) << recording->output() << world.log();
     EXPECT_TRUE(world.library().empty());
     EXPECT_TRUE(test::eventually([this] { return world.store().empty(); }));
     expectWhole(movie, 1, 15);
@@ -160,7 +153,7 @@ TEST_F(RecordingTest, CtrlCStopsAndSaves) {
     ASSERT_TRUE(recording->waitForLine("recording")) << world.log();
     std::this_thread::sleep_for(1s);
     recording->signal(SIGINT);
-    EXPECT_EQ(end(*recording), 0) << recording->output();
+    EXPECT_EQ(recording->waitForEnd(), 0) << recording->output();
     EXPECT_NE(recording->output().find(" to the library\n"), std::string::npos) << recording->output();
     expectWhole(savedMovie(), 0, 15);
 }
@@ -172,7 +165,7 @@ TEST_F(RecordingTest, StopFromAnotherTerminalEndsTheRecording) {
               std::pair(0, std::string("recording the whole screen, without the microphone\n")));
     std::this_thread::sleep_for(500ms);
     EXPECT_EQ(run({"stop"}), std::pair(0, std::string("saved to the library\n"))) << world.log();
-    EXPECT_EQ(end(*recording), 0);
+    EXPECT_EQ(recording->waitForEnd(), 0);
     EXPECT_NE(recording->output().find("the recording was stopped from elsewhere\n"), std::string::npos);
     expectWhole(savedMovie(), 0, 15);
     EXPECT_EQ(run({"status"}), std::pair(0, std::string("nothing is being recorded\n")));
@@ -186,7 +179,7 @@ TEST_F(RecordingTest, WhatARunningRecordingDoesNotTakeIsSaid) {
                                                        "the whole screen; it goes on\n")));
     EXPECT_EQ(run({"resume"}).first, 1);
     recording->signal(SIGTERM);
-    EXPECT_EQ(end(*recording), 0);
+    EXPECT_EQ(recording->waitForEnd(), 0);
     EXPECT_NE(recording->output().find(R"({"saved":"library","seconds":)"), std::string::npos)
         << recording->output();
 }
@@ -194,7 +187,7 @@ TEST_F(RecordingTest, WhatARunningRecordingDoesNotTakeIsSaid) {
 TEST_F(RecordingTest, RecordersFollowOneAnother) {
     for (int round = 1; round <= 3; ++round) {
         const auto recording = begin({"--seconds", "0.5"});
-        EXPECT_EQ(end(*recording), 0) << recording->output() << world.log();
+        EXPECT_EQ(recording->waitForEnd(), 0) << recording->output() << world.log();
         EXPECT_EQ(world.library().size(), static_cast<std::size_t>(round));
     }
     EXPECT_TRUE(test::eventually([this] { return world.store().empty(); }));
