@@ -34,8 +34,17 @@ struct ProtocolTable<KVLibraryProtocol> {
     using P = KVLibraryProtocol;
     static constexpr std::string_view kName = "com.quillon.KelvoKit.KVLibraryProtocol";
     static constexpr std::tuple kMessages{
-        Message<&P::listMovies>{"listMovies", {}, {"movies", "error"}},
-        Message<&P::recoverMovies>{"recoverMovies", {}, {"movies", "error"}},
+        Message<&P::listMovies>{
+            {"listMovies", "What the library holds. Needs the right com.quillon.private.kelvo-kit."},
+            {},
+            {Named{"movies", "oldest first; each with identifier, path, creationDate and size"},
+             Named{"error", "why it cannot be told"}}},
+        Message<&P::recoverMovies>{
+            {"recoverMovies",
+             "Save what an earlier run left in the store. Needs the right com.quillon.private.kelvo-kit."},
+            {},
+            {Named{"movies", "each with its name in the store, and with identifier and path, or error"},
+             Named{"error", "why nothing was tried"}}},
     };
 };
 

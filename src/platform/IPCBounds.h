@@ -29,6 +29,8 @@ inline constexpr std::size_t kMostDescriptors = 4;
 inline constexpr std::size_t kMostWaitingMessages = 32;
 inline constexpr std::size_t kMostWaitingBytes = std::size_t{1} << 20;
 inline constexpr std::size_t kMostWaitingDescriptors = 8;
+/// Messages of one connection that are looked at in a row. Then everybody else has a turn.
+inline constexpr std::size_t kMostMessagesATurn = 64;
 /// Requests of one connection whose replies are owed.
 inline constexpr std::size_t kMostOwedReplies = 256;
 /// Bytes that wait for one peer to read them. Two seconds of captured sound fit many times.

@@ -4,6 +4,7 @@
 #include "support/Eventually.h"
 #include "support/SoundServer.h"
 #include "support/TemporaryDirectory.h"
+#include "support/x11/WindowManager.h"
 #include "support/x11/XvfbServer.h"
 
 #include <filesystem>
@@ -24,15 +25,11 @@ class DaemonWorld {
 
     DaemonWorld() {
         isSoundThere_ = sound_.start();
-        hasManager_ = eventually([this] {
-            const std::string look = "xprop -root _NET_SUPPORTING_WM_CHECK | grep -q '#'";
-            return ChildProcess({"sh", "-c", look}, {{"DISPLAY", display()}}).waitForExit() == 0;
-        });
         startDaemon();
     }
 
     /// Whether everything came up.
-    bool isUp() const { return isSoundThere_ && hasManager_ && isListening_; }
+    bool isUp() const { return isSoundThere_ && windowManager_.isReady() && isListening_; }
 
     const std::string& root() const { return root_.path(); }
     const std::string& socket() const { return socket_; }
@@ -82,11 +79,10 @@ class DaemonWorld {
     const TemporaryDirectory root_;
     const std::string socket_ = root_.path() + "/run/kelvod/com.quillon.kelvod";
     const XvfbServer screen_{kWidth, kHeight};
-    const ChildProcess windowManager_{{"openbox"}, {{"DISPLAY", screen_.display()}}};
+    const WindowManager windowManager_{screen_.display()};
     SoundServer sound_;
     std::unique_ptr<ChildProcess> daemon_;
     bool isSoundThere_ = false;
-    bool hasManager_ = false;
     bool isListening_ = false;
 };
 

@@ -35,7 +35,7 @@ std::string outputOf(const std::string& command) {
 
 std::string decodingComplaints(const std::string& path) {
     return outputOf("ffmpeg -nostdin -v warning -i " + quoted(path) +
-                    " -map 0 -fps_mode passthrough -enc_time_base -1 -f null - 2>&1");
+                    " -map 0 -fps_mode:v passthrough -enc_time_base:v -1 -f null - 2>&1");
 }
 
 std::string probeStream(const std::string& path, const std::string& stream, const std::string& entry) {

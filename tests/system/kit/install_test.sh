@@ -9,6 +9,10 @@ trap 'rm -rf "$work"' EXIT
 cmake --install "$build" --component kelvokit --prefix "$work/first" >"$work/log"
 mv "$work/first" "$work/prefix"
 test -z "$(find "$work/prefix" -name kelvod -type f)"
+# Nothing is exported that applications cannot use.
+library=$(find "$work/prefix" -name 'libKelvoKit.so.*' -type f)
+inner=$(nm -DC --defined-only "$library" | grep -E 'kelvo::|Core>|Content' || true)
+[ -z "$inner" ] || { echo "exported: $inner"; exit 1; }
 
 expected="-5814 There is no valid connection to the recording service."
 check() {

@@ -16,14 +16,15 @@ struct CounterFrame {
     double seconds;  ///< since the movie's beginning
 };
 
-/// Every frame of the movie, decoded by a program that is not ours.
-inline std::vector<CounterFrame> readCounterMovie(const std::string& path) {
+/// Every frame of the movie, decoded by a program that is not ours. `cut` is the part of the frame in which
+/// the counter is, as that program's crop filter takes it; all of it when empty.
+inline std::vector<CounterFrame> readCounterMovie(const std::string& path, const std::string& cut = {}) {
     constexpr std::uint32_t kWidth = 80;
     constexpr std::uint32_t kHeight = 50;
     const std::vector<double> times = frameTimes(path, "v:0");
-    const std::string pixels = outputOf("ffmpeg -v error -i '" + path +
-                                        "' -map 0:v:0 -fps_mode passthrough -enc_time_base -1 -vf "
-                                        "scale=80:50:flags=area -pix_fmt gray -f rawvideo -");
+    const std::string pixels = outputOf(
+        "ffmpeg -v error -i '" + path + "' -map 0:v:0 -fps_mode passthrough -enc_time_base -1 -vf " +
+        (cut.empty() ? "" : "crop=" + cut + ",") + "scale=80:50:flags=area -pix_fmt gray -f rawvideo -");
     std::vector<CounterFrame> frames;
     for (std::size_t i = 0; i < times.size() && (i + 1) * kWidth * kHeight <= pixels.size(); ++i) {
         const auto* const picture =

@@ -1,21 +1,9 @@
 #include "CounterMovie.h"
 #include "CounterProgram.h"
-#include "HeldUpMoments.h"
-#include "platform/linux/files/LinuxFileSystem.h"
-#include "platform/linux/media/LavMediaService.h"
-#include "platform/linux/system/SystemClock.h"
-#include "platform/linux/x11/X11Screen.h"
-#include "platform/simulated/SimulatedDevice.h"
-#include "session/KVRecordingSession.h"
-#include "support/Eventually.h"
-#include "support/TemporaryDirectory.h"
+#include "support/RecordedSession.h"
 #include "support/x11/XClient.h"
-#include "support/x11/XvfbServer.h"
 
-#include <algorithm>
-#include <future>
 #include <map>
-#include <thread>
 
 #include <gtest/gtest.h>
 
@@ -31,60 +19,13 @@ constexpr Time kInterval{1000000000 / 60};
 /// How far a frame's time may lie from when its picture was drawn.
 constexpr Time kTolerance = 4ms;
 
-/// A counter on a real display, recorded through session, writer and encoder into a movie file.
-class RecordedScreen : public testing::Test {
+/// A counter on a real display, recorded into a movie file.
+class RecordedScreen : public RecordedSession {
   protected:
-    /// Recorded without a pause, its times moved by `offset`.
-    struct Stretch {
-        Time begin;
-        Time end;
-        Time offset;
-    };
+    /// With room for the screen to turn.
+    RecordedScreen() : RecordedSession(kWidth, kHeight, nullptr, kHeight) {}
 
-    RecordedScreen() {
-        Platform platform = device_.platform();
-        platform.clock = std::make_shared<SystemClock>();
-        platform.fileSystem = std::make_shared<LinuxFileSystem>(root_);
-        platform.media = std::make_shared<LavMediaService>(platform.fileSystem);
-        platform.screenCapture = screen_;
-        platform.displayMirroring = screen_;
-        EXPECT_FALSE(platform.fileSystem->createDirectory(KVTemporaryFileStore::_srTempPath()));
-        session_ = std::dynamic_pointer_cast<KVRecordingSession>(
-            recordingSessionFactory(platform)("com.example.counter"));
-        session_->setWindowSize({kWidth, kHeight});
-    }
-
-    void start() {
-        session_->setRecording(true);
-        std::promise<void> started;
-        session_->startSessionWithHandler([&] { started.set_value(); });
-        started.get_future().wait();
-        awaitFirstFrame();
-    }
-    void awaitFirstFrame() {
-        EXPECT_TRUE(eventually(
-            [this] { return !session_->sessionWasResumed() && !session_->firstSampleTimestamp().isZero(); }));
-        std::this_thread::sleep_for(50ms);
-    }
-    /// Lets the recording go on, and notes by how much it has moved its times.
-    void record(std::chrono::milliseconds duration) {
-        const Time begin = CounterProgram::now();
-        std::this_thread::sleep_for(duration);
-        stretches_.push_back({begin, CounterProgram::now(), Time(session_->sampleTimeOffset().value)});
-    }
-    void pause(std::chrono::milliseconds duration) {
-        session_->pauseSession();
-        std::this_thread::sleep_for(duration);
-        session_->resumeSessionWithContextID(counter_.window());
-        awaitFirstFrame();
-    }
-    std::string finish() {
-        beginning_ = Time(session_->firstSampleTimestamp().value);
-        std::promise<std::optional<URL>> finished;
-        session_->finishSessionWithHandler([&](const auto& url, const auto&) { finished.set_value(url); });
-        const auto url = finished.get_future().get();
-        return url ? root_->hostPath(url->path()) : "";
-    }
+    void pause(std::chrono::milliseconds duration) { RecordedSession::pause(duration, counter_.window()); }
 
     /// Holds the movie against what was drawn while recording.
     void checkMovie(const std::vector<CounterFrame>& frames) {
@@ -102,7 +43,7 @@ class RecordedScreen : public testing::Test {
         const auto drawings = counter_.stop();
         for (std::size_t i = 0; i + 1 < drawings.size(); ++i) {
             const auto& drawing = drawings[i];
-            const auto stretch = stretchOf(drawing);
+            const auto stretch = stretchOf(drawing.begun, drawing.done + 2 * kInterval);
             if (!stretch || drawings[i + 1].done - drawing.done < kInterval) continue;
             if (heldUp_.touch(drawing.begun - 2 * kInterval, drawing.done + 2 * kInterval)) continue;
             ++checked;
@@ -121,25 +62,18 @@ class RecordedScreen : public testing::Test {
         EXPECT_GT(checked, 10);
     }
 
-    /// The stretch of the recording in which the value was drawn and had its turn.
-    std::optional<Stretch> stretchOf(const CounterProgram::Drawing& drawing) const {
-        const auto found = std::ranges::find_if(stretches_, [&](const Stretch& stretch) {
-            return drawing.begun >= stretch.begin && drawing.done + 2 * kInterval <= stretch.end;
-        });
-        return found == stretches_.end() ? std::nullopt : std::optional(*found);
-    }
-
-    SimulatedDevice device_;
-    TemporaryDirectory folder_;
-    std::shared_ptr<const DeviceRoot> root_ = std::make_shared<const DeviceRoot>(folder_.path(), "");
-    XvfbServer server_{kWidth, kHeight};
-    std::shared_ptr<x11::X11Screen> screen_ = std::make_shared<x11::X11Screen>(server_.display());
+    XClient client_{server_.display()};
+    const bool isUpright_ = client_.resizeScreen(kWidth, kHeight);
     CounterProgram counter_{server_.display(), kWidth, kHeight};
-    HeldUpMoments heldUp_;
-    std::shared_ptr<KVRecordingSession> session_;
-    std::vector<Stretch> stretches_;
-    Time beginning_{0};
 };
+
+std::vector<std::uint32_t> numbersOf(const std::vector<CounterFrame>& frames) {
+    std::vector<std::uint32_t> numbers;
+    for (const CounterFrame& frame : frames) {
+        if (frame.number) numbers.push_back(*frame.number);
+    }
+    return numbers;
+}
 
 TEST_F(RecordedScreen, EveryValueOfACounterIsInTheMovieOnceAtItsTimeAndPausesAreCutOut) {
     session_->setSystemRecording(true);
@@ -169,6 +103,25 @@ TEST_F(RecordedScreen, CoveredWindowIsRecordedWithoutAPixelOfItsCover) {
     const std::string movie = finish();
     checkMovie(readCounterMovie(movie));
     EXPECT_FALSE(showsGreen(movie));
+}
+
+TEST_F(RecordedScreen, ScreenThatTurnsStaysWholeInTheMovie) {
+    ASSERT_TRUE(isUpright_);
+    session_->setSystemRecording(true);
+    start();
+    record(500ms);
+    ASSERT_TRUE(client_.resizeScreen(kHeight, kWidth));
+    client_.place(counter_.window(), {0, 0, kHeight, kWidth});
+    record(1000ms);
+    const std::string movie = finish();
+    // The screen that lies across fills the width of the upright movie and leaves the rest black.
+    const auto upright = numbersOf(readCounterMovie(movie));
+    const auto lying = numbersOf(readCounterMovie(movie, "180:102:0:109"));
+    ASSERT_FALSE(upright.empty());
+    ASSERT_FALSE(lying.empty());
+    EXPECT_LT(upright.back(), lying.back());
+    EXPECT_GE(lying.size(), 20U);
+    EXPECT_TRUE(std::ranges::is_sorted(lying));
 }
 
 TEST_F(RecordedScreen, DisplayThatStandsStillHoldsUpNeitherPauseNorFinish) {

@@ -1,5 +1,4 @@
 #include "GoldenFile.h"
-#include "RawEnd.h"
 #include "ipc/KVClientProtocolTable.h"
 #include "ipc/KVRemoteDaemon.h"
 #include "platform/linux/ipc/Introspection.h"
@@ -9,6 +8,7 @@
 #include "support/Eventually.h"
 #include "support/FakeClientProxy.h"
 #include "support/FakeDaemon.h"
+#include "support/RawSocket.h"
 
 #include <algorithm>
 #include <set>
@@ -19,7 +19,7 @@
 namespace kelvo {
 namespace {
 
-using test::RawEnd;
+using test::RawSocket;
 using test::WireMessage;
 
 constexpr const char* kServersAnswers = "OK 6b656c766f640000000000000000001f\r\nAGREE_UNIX_FD\r\n";
@@ -125,8 +125,8 @@ class MessageBytesTest : public testing::Test {
     ~MessageBytesTest() override { loop->stop(); }
 
     /// A connection as a client has it, with its greeting read.
-    std::shared_ptr<SocketConnection> clientAt(RawEnd& end) {
-        auto client = std::make_shared<SocketConnection>(Side::client, end.takeOther(), loop, nullptr,
+    std::shared_ptr<SocketConnection> clientAt(UniqueFd socket) {
+        auto client = std::make_shared<SocketConnection>(Side::client, std::move(socket), loop, nullptr,
                                                          nullptr, nullptr);
         client->setRemoteInterface(interfaceOf<KVDaemonProtocol>());
         client->setExported(interfaceOf<KVClientProtocol>(),
@@ -135,8 +135,8 @@ class MessageBytesTest : public testing::Test {
         return client;
     }
     /// A connection as the daemon has it, with its answers to a client's greeting read.
-    std::shared_ptr<SocketConnection> serverAt(RawEnd& end) {
-        auto server = std::make_shared<SocketConnection>(Side::server, end.takeOther(), loop, nullptr,
+    std::shared_ptr<SocketConnection> serverAt(RawSocket& end, UniqueFd socket) {
+        auto server = std::make_shared<SocketConnection>(Side::server, std::move(socket), loop, nullptr,
                                                          nullptr, nullptr);
         server->setRemoteInterface(interfaceOf<KVClientProtocol>());
         server->setExported(interfaceOf<KVDaemonProtocol>(),
@@ -147,8 +147,8 @@ class MessageBytesTest : public testing::Test {
         return server;
     }
     WireMessage request(const std::function<void(KVDaemonProtocol&)>& make) {
-        RawEnd end;
-        const auto client = clientAt(end);
+        auto [end, socket] = RawSocket::pair();
+        const auto client = clientAt(std::move(socket));
         KVRemoteDaemon remote(*client, nullptr);
         make(remote);
         end.readUntil("BEGIN\r\n");
@@ -157,8 +157,8 @@ class MessageBytesTest : public testing::Test {
         return message;
     }
     WireMessage callback(const DaemonCallback& each) {
-        RawEnd end;
-        const auto server = serverAt(end);
+        auto [end, socket] = RawSocket::pair();
+        const auto server = serverAt(end, std::move(socket));
         RemoteClient remote(*server, nullptr);
         each.make(remote);
         WireMessage message = end.read();
@@ -166,8 +166,8 @@ class MessageBytesTest : public testing::Test {
         return message;
     }
     WireMessage answerTo(const WireMessage& message) {
-        RawEnd end;
-        const auto server = serverAt(end);
+        auto [end, socket] = RawSocket::pair();
+        const auto server = serverAt(end, std::move(socket));
         end.write(message);
         WireMessage answer = end.read();
         server->invalidate();
@@ -189,8 +189,8 @@ class MessageBytesTest : public testing::Test {
 };
 
 TEST_F(MessageBytesTest, Greetings) {
-    RawEnd end;
-    const auto client = clientAt(end);
+    auto [end, socket] = RawSocket::pair();
+    const auto client = clientAt(std::move(socket));
     EXPECT_EQ(end.readUntil("BEGIN\r\n"), dbus::clientGreeting(::getuid()));
     EXPECT_EQ(dbus::clientGreeting(1000),
               std::string(1, '\0') + "AUTH EXTERNAL 31303030\r\nNEGOTIATE_UNIX_FD\r\nBEGIN\r\n");
@@ -240,8 +240,8 @@ TEST_F(MessageBytesTest, FrameThatIsGivenBack) {
     const auto all = daemonCallbacks();
     const auto frame = std::ranges::find(all, std::string("captureHandlerWithSample"), &DaemonCallback::name);
     ASSERT_NE(frame, all.end());
-    RawEnd end;
-    const auto client = clientAt(end);
+    auto [end, socket] = RawSocket::pair();
+    const auto client = clientAt(std::move(socket));
     end.readUntil("BEGIN\r\n");
     end.write(kServersAnswers);
     end.write(callback(*frame));
@@ -277,8 +277,8 @@ class WrongReplier : public IPCExportedObject {
 };
 
 TEST_F(MessageBytesTest, ReplyThatCannotBeSentIsAnError) {
-    RawEnd end;
-    const auto server = serverAt(end);
+    auto [end, socket] = RawSocket::pair();
+    const auto server = serverAt(end, std::move(socket));
     server->setExported(interfaceOf<KVDaemonProtocol>(), std::make_shared<WrongReplier>());
     end.write(standardCall(dbus::kObjectPath, "", "stopRecordingWithHandler"));
     Sheet sheet("failed_reply");

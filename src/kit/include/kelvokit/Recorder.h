@@ -160,7 +160,7 @@ class KELVOKIT_EXPORT Recorder {
   private:
     class KELVOKIT_HIDDEN Core;
     friend struct RecorderTestAccess;
-    explicit Recorder(std::shared_ptr<Core> core);
+    KELVOKIT_HIDDEN explicit Recorder(std::shared_ptr<Core> core);
     std::shared_ptr<Core> core_;
 };
 

@@ -31,7 +31,7 @@ class KELVOKIT_EXPORT Frame {
     std::optional<SampleTime> presentationTime() const;
 
     struct KELVOKIT_HIDDEN Content;
-    explicit Frame(std::shared_ptr<const Content> content);
+    KELVOKIT_HIDDEN explicit Frame(std::shared_ptr<const Content> content);
 
   private:
     std::shared_ptr<const Content> content_;
@@ -59,7 +59,7 @@ class KELVOKIT_EXPORT AudioBuffer {
     std::optional<SampleTime> presentationTime() const;
 
     struct KELVOKIT_HIDDEN Content;
-    explicit AudioBuffer(std::shared_ptr<const Content> content);
+    KELVOKIT_HIDDEN explicit AudioBuffer(std::shared_ptr<const Content> content);
 
   private:
     std::shared_ptr<const Content> content_;

@@ -121,11 +121,15 @@ class HeaderReader {
     bool isGood_ = true;
 };
 
+/// What most messages' headers fit into; a larger one grows.
+constexpr std::size_t kUsualHeader = 384;
+
 class HeaderWriter {
   public:
     explicit HeaderWriter(const Message& message) : message_(message) {}
 
     Bytes write() {
+        out_.reserve(kUsualHeader + message_.body.size());
         for (const std::uint8_t byte :
              {std::uint8_t{'l'}, static_cast<std::uint8_t>(message_.type), message_.flags, std::uint8_t{1}})
             put(byte);
@@ -170,8 +174,9 @@ class HeaderWriter {
             put(byte);
     }
     void putNumber(std::uint32_t number) {
-        const auto bytes = std::bit_cast<std::array<std::byte, 4>>(number);
-        out_.insert(out_.end(), bytes.begin(), bytes.end());
+        const std::size_t place = out_.size();
+        out_.resize(place + sizeof(number));
+        std::memcpy(out_.data() + place, &number, sizeof(number));
     }
     void put(std::uint8_t byte) { out_.push_back(std::byte{byte}); }
     void align(std::size_t boundary) {

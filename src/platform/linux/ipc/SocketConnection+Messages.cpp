@@ -86,7 +86,7 @@ Result<Array> SocketConnection::readArguments(dbus::Message& message, const IPCM
     const bool allowed = allowsObjects(description.arguments);
     // Only a client is sent one frame after the other.
     if (!allowed || side_ == Side::server) return dbus::readBody(message, allowed);
-    const auto now = Moment::clock::now();
+    const auto now = loop_->now();
     auto arguments =
         dbus::readBody(message, allowed, [&](UniqueFd descriptor, const VideoSurface::Geometry& geometry) {
             return surfaces_.open(std::move(descriptor), geometry, now);

@@ -105,6 +105,7 @@ void SocketConnection::ready(std::uint32_t) {
     wasLookedAt_ = true;
     flush(held->get());
     isHeldUp_ = false;
+    messagesThisTurn_ = 0;
     handleReceived();
     if (!isPaused() && !isOver()) receive(held->get());
     if (isOver()) return;
@@ -117,7 +118,7 @@ void SocketConnection::noteDeadline() {
     if (!isUnfinished) {
         deadline_.reset();
     } else if (!deadline_) {
-        deadline_ = Moment::clock::now() + kPatience;
+        deadline_ = loop_->now() + kPatience;
         loop_->tickAt(*deadline_);
     }
 }
@@ -138,7 +139,7 @@ std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
 void SocketConnection::receive(int socket) {
     constexpr int kMostRounds = 16;
     for (int round = 0; round < kMostRounds; ++round) {
-        if (isPaused() || isOver()) return;
+        if (isPaused() || isHeldUp_ || isOver()) return;
         if (!receiveSome(socket)) {
             // All of what the peer sent has been taken; nothing can be told to it.
             if (cannotSend_) end(State::lost);
@@ -179,11 +180,12 @@ void SocketConnection::handleReceived() {
     if (isOver() || !authenticate()) return;
     do {
         // Told before anybody asks again: whoever serves the last message that waits looks at it.
-        if (isPaused()) {
+        if (isPaused() || messagesThisTurn_ >= kMostMessagesATurn) {
             isHeldUp_ = true;
             return;
         }
         if (isOver() || !handleNextMessage()) break;
+        ++messagesThisTurn_;
         deadline_.reset();
     } while (true);
     if (incoming_.empty() && !receivedDescriptors_.empty() && !isOver())

@@ -107,6 +107,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
 
     // The loop's thread alone.
     Bytes incoming_;
+    std::size_t messagesThisTurn_ = 0;
     std::vector<UniqueFd> receivedDescriptors_;
     std::optional<dbus::ServerAuthentication> authentication_;
     std::optional<Moment> deadline_;

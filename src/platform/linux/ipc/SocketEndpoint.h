@@ -19,6 +19,12 @@ class SocketEndpoint : public IPCEndpoint {
 
     int descriptor() const { return socket_.get(); }
 
+    /// Sends one end of a fresh connection to the listener. Never waits.
+    OptionalError sendConnection(int connection) const;
+    /// The connection in the next packet at the listener's end of an endpoint's socket; none when the packet
+    /// holds anything else, whose descriptors are closed. `isAtEnd` says that no packet is there.
+    static UniqueFd receiveConnection(int listener, bool& isAtEnd);
+
   private:
     const UniqueFd socket_;
 };

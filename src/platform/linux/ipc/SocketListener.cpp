@@ -8,19 +8,19 @@
 #include <array>
 #include <atomic>
 #include <cerrno>
-#include <cstring>
 #include <fcntl.h>
 #include <filesystem>
 #include <sys/epoll.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <unistd.h>
-#include <vector>
 
 namespace kelvo {
 namespace {
 
 constexpr int kBacklog = 128;
+/// Connections that are taken in a row, so that those who come without end do not keep the loop.
+constexpr int kMostATurn = 16;
 
 /// How many connections are open, altogether and for each process.
 struct OpenConnections {
@@ -45,39 +45,6 @@ std::int32_t processBehind(int socket) {
     ucred credentials{};
     socklen_t size = sizeof(credentials);
     return ::getsockopt(socket, SOL_SOCKET, SO_PEERCRED, &credentials, &size) == 0 ? credentials.pid : 0;
-}
-
-bool isStreamSocket(int descriptor) {
-    int domain = -1;
-    int type = -1;
-    socklen_t size = sizeof(int);
-    return ::getsockopt(descriptor, SOL_SOCKET, SO_DOMAIN, &domain, &size) == 0 && domain == AF_UNIX &&
-           ::getsockopt(descriptor, SOL_SOCKET, SO_TYPE, &type, &size) == 0 && type == SOCK_STREAM;
-}
-
-/// The connection that stands in a packet of an endpoint's socket; none for any other packet.
-UniqueFd receiveConnection(int socket, bool& isAtEnd) {
-    std::byte byte{};
-    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int))> control;
-    iovec part{&byte, 1};
-    msghdr header{};
-    header.msg_iov = &part;
-    header.msg_iovlen = 1;
-    header.msg_control = control.data();
-    header.msg_controllen = control.size();
-    const ssize_t count = ::recvmsg(socket, &header, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
-    isAtEnd = count <= 0;
-    const cmsghdr* item = isAtEnd ? nullptr : CMSG_FIRSTHDR(&header);
-    if (item == nullptr || item->cmsg_level != SOL_SOCKET || item->cmsg_type != SCM_RIGHTS) return UniqueFd();
-    // Alignment leaves room for a second one, which a hostile packet fills: owned, so that it is closed.
-    std::vector<UniqueFd> received;
-    for (std::size_t place = CMSG_LEN(0); place + sizeof(int) <= item->cmsg_len; place += sizeof(int)) {
-        int descriptor = -1;
-        std::memcpy(&descriptor, reinterpret_cast<const char*>(item) + place, sizeof(descriptor));
-        received.emplace_back(descriptor);
-    }
-    const bool isConnection = received.size() == 1 && isStreamSocket(received.front().get());
-    return isConnection ? std::move(received.front()) : UniqueFd();
 }
 
 UniqueFd openNothing() {
@@ -127,8 +94,9 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
 
     void ready(std::uint32_t) override {
         bool isAtEnd = false;
-        while (!isAtEnd) {
-            UniqueFd next = isNamed_ ? acceptNext(isAtEnd) : receiveConnection(socket_.get(), isAtEnd);
+        for (int count = 0; !isAtEnd && count < kMostATurn; ++count) {
+            UniqueFd next =
+                isNamed_ ? acceptNext(isAtEnd) : SocketEndpoint::receiveConnection(socket_.get(), isAtEnd);
             if (next) welcome(std::move(next));
         }
         const std::lock_guard lock(mutex_);

@@ -17,6 +17,9 @@ constexpr SocketLoop::Token kWakeToken = 0;
 
 /// What the thread uses; it may outlive the loop when that goes on the thread itself.
 struct SocketLoop::Shared {
+    explicit Shared(Clock itsClock) : clock(std::move(itsClock)) {}
+
+    const Clock clock;
     UniqueFd epoll{::epoll_create1(EPOLL_CLOEXEC)};
     UniqueFd wake{::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)};
     std::atomic<bool> isStopped{false};
@@ -33,13 +36,12 @@ struct SocketLoop::Shared {
 
     int timeout() const {
         if (!nextTick) return -1;
-        const auto left =
-            std::chrono::ceil<std::chrono::milliseconds>(*nextTick - SocketWatcher::Moment::clock::now());
+        const auto left = std::chrono::ceil<std::chrono::milliseconds>(*nextTick - clock());
         return left.count() > 0 ? static_cast<int>(left.count()) : 0;
     }
 
     void tickWhenDue() {
-        const auto now = SocketWatcher::Moment::clock::now();
+        const auto now = clock();
         if (!nextTick || *nextTick > now) return;
         nextTick.reset();
         std::vector<std::shared_ptr<SocketWatcher>> all;
@@ -55,7 +57,7 @@ struct SocketLoop::Shared {
     }
 };
 
-SocketLoop::SocketLoop() : shared_(std::make_shared<Shared>()) {
+SocketLoop::SocketLoop(Clock clock) : shared_(std::make_shared<Shared>(std::move(clock))) {
     epoll_event event{};
     event.events = EPOLLIN;
     event.data.u64 = kWakeToken;
@@ -117,6 +119,10 @@ void SocketLoop::remove(int descriptor, Token token) {
     if (found == shared_->watchers.end()) return;
     removed = std::move(found->second);
     shared_->watchers.erase(found);
+}
+
+SocketWatcher::Moment SocketLoop::now() const {
+    return shared_->clock();
 }
 
 void SocketLoop::tickAt(SocketWatcher::Moment moment) {

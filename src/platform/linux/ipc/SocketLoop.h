@@ -4,6 +4,7 @@
 
 #include <chrono>
 #include <cstdint>
+#include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -29,8 +30,10 @@ class SocketWatcher {
 class SocketLoop {
   public:
     using Token = std::uint64_t;
+    /// The time, which never goes backwards.
+    using Clock = std::function<SocketWatcher::Moment()>;
 
-    SocketLoop();
+    explicit SocketLoop(Clock clock = SocketWatcher::Moment::clock::now);
     ~SocketLoop();
     SocketLoop(const SocketLoop&) = delete;
     SocketLoop& operator=(const SocketLoop&) = delete;
@@ -44,6 +47,7 @@ class SocketLoop {
     void arm(int descriptor, Token token, std::uint32_t events);
     /// Before the descriptor is closed.
     void remove(int descriptor, Token token);
+    SocketWatcher::Moment now() const;
     /// Ticks every watcher at `moment` or soon after. On the loop's thread.
     void tickAt(SocketWatcher::Moment moment);
 

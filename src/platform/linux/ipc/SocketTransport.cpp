@@ -5,33 +5,10 @@
 
 #include <array>
 #include <cerrno>
-#include <cstring>
 #include <sys/socket.h>
 #include <sys/un.h>
 
 namespace kelvo {
-namespace {
-
-/// Sends one end of a fresh connection to the listener behind an endpoint.
-OptionalError sendConnection(int endpoint, int connection) {
-    std::byte byte{};
-    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int))> control{};
-    iovec part{&byte, 1};
-    msghdr header{};
-    header.msg_iov = &part;
-    header.msg_iovlen = 1;
-    header.msg_control = control.data();
-    header.msg_controllen = control.size();
-    cmsghdr* item = CMSG_FIRSTHDR(&header);
-    item->cmsg_level = SOL_SOCKET;
-    item->cmsg_type = SCM_RIGHTS;
-    item->cmsg_len = CMSG_LEN(sizeof(int));
-    std::memcpy(CMSG_DATA(item), &connection, sizeof(connection));
-    if (::sendmsg(endpoint, &header, MSG_NOSIGNAL | MSG_DONTWAIT) == 1) return std::nullopt;
-    return KVError::posix(errno, "endpoint");
-}
-
-}  // namespace
 
 std::string SocketTransport::pathOf(std::string_view serviceName) const {
     return root_->hostPath("/run/kelvod/" + std::string(serviceName));
@@ -69,7 +46,7 @@ Result<IPCConnectionRef> SocketTransport::connectToEndpoint(const std::shared_pt
         return KVError::posix(errno, "endpoint");
     UniqueFd own(ends[0]);
     const UniqueFd sent(ends[1]);
-    if (const OptionalError error = sendConnection(way->descriptor(), sent.get())) return *error;
+    if (const OptionalError error = way->sendConnection(sent.get())) return *error;
     return IPCConnectionRef(std::make_shared<SocketConnection>(SocketConnection::Side::client, std::move(own),
                                                                loop_, bundles_, root_, nullptr));
 }

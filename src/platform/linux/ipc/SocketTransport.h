@@ -13,9 +13,13 @@ namespace kelvo {
 /// "/run/kelvod". Thread-safe.
 class SocketTransport : public IPCTransport {
   public:
-    /// `bundles` tells which rights a peer holds; none holds any without.
-    SocketTransport(std::shared_ptr<const DeviceRoot> root, std::shared_ptr<BundleService> bundles)
-        : root_(std::move(root)), bundles_(std::move(bundles)) {}
+    /// `bundles` tells which rights a peer holds; none holds any without. `clock` measures a peer's
+    /// deadlines.
+    SocketTransport(std::shared_ptr<const DeviceRoot> root, std::shared_ptr<BundleService> bundles,
+                    SocketLoop::Clock clock = SocketWatcher::Moment::clock::now)
+        : root_(std::move(root)),
+          bundles_(std::move(bundles)),
+          loop_(std::make_shared<SocketLoop>(std::move(clock))) {}
 
     ~SocketTransport() override { loop_->stop(); }
     SocketTransport(const SocketTransport&) = delete;
@@ -35,7 +39,7 @@ class SocketTransport : public IPCTransport {
 
     const std::shared_ptr<const DeviceRoot> root_;
     const std::shared_ptr<BundleService> bundles_;
-    const std::shared_ptr<SocketLoop> loop_ = std::make_shared<SocketLoop>();
+    const std::shared_ptr<SocketLoop> loop_;
 };
 
 }  // namespace kelvo

@@ -189,5 +189,26 @@ TEST_F(X11ScreenCaptureTest, NativeOrientationIsThatOfThePanel) {
     EXPECT_EQ(nativeScreenOrientation(":4711"), std::nullopt);
 }
 
+TEST_F(X11ScreenCaptureTest, NativeOrientationStaysWhenTheScreenTurns) {
+    ASSERT_TRUE(client_.resizeScreen(100, 160));
+    EXPECT_EQ(nativeScreenOrientation(server_.display()), 90.0F);
+}
+
+TEST_F(X11ScreenCaptureTest, TurningBackAndForthIsFollowedWithFramesOfEachShape) {
+    const auto window = client_.createWindow({0, 0, 200, 160}, 0);
+    ASSERT_TRUE(startAndAwaitFrame());
+    client_.movePointer(0, 0);  // where it hides nothing of a number
+    std::uint32_t number = 0;
+    for (const auto& [width, height] : {std::pair{120, 160}, {160, 120}, {122, 160}}) {
+        ASSERT_TRUE(client_.resizeScreen(width, height));
+        client_.place(window, {0, 0, width, height});
+        client_.showNumber(window, ++number);
+        ASSERT_TRUE(eventually([&] { return recorder_->hasNumber(number); }));
+        EXPECT_EQ(recorder_->last()->width, static_cast<std::uint32_t>(width));
+        EXPECT_EQ(recorder_->last()->height, static_cast<std::uint32_t>(height));
+    }
+    EXPECT_TRUE(recorder_->failures().empty());
+}
+
 }  // namespace
 }  // namespace kelvo::x11

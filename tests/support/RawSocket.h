@@ -7,10 +7,13 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
 #include <cstring>
+#include <span>
 #include <string>
 #include <sys/socket.h>
 #include <sys/time.h>
+#include <sys/un.h>
 #include <utility>
 #include <vector>
 
@@ -24,32 +27,44 @@ struct WireMessage {
     std::vector<UniqueFd> descriptors;
 };
 
-/// The bare end of a stream socket whose other end a connection has: reads and writes what stands on the
-/// wire.
-class RawEnd {
+/// A peer without manners: the bare end of a stream socket, which reads and writes whatever it likes.
+class RawSocket {
   public:
-    RawEnd() {
+    explicit RawSocket(UniqueFd socket) : socket_(std::move(socket)) {
+        const timeval patience{20, 0};
+        ::setsockopt(socket_.get(), SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof(patience));
+    }
+    /// Connected to the socket at `path`.
+    explicit RawSocket(const std::string& path)
+        : RawSocket(UniqueFd(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0))) {
+        sockaddr_un address{};
+        address.sun_family = AF_UNIX;
+        path.copy(address.sun_path, sizeof(address.sun_path) - 1);
+        EXPECT_EQ(::connect(socket_.get(), reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
+    }
+    /// Connected to the other end, which is given back.
+    static std::pair<RawSocket, UniqueFd> pair() {
         std::array<int, 2> ends{-1, -1};
         EXPECT_EQ(::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends.data()), 0);
-        own_ = UniqueFd(ends[0]);
-        other_ = UniqueFd(ends[1]);
-        const timeval patience{20, 0};
-        ::setsockopt(own_.get(), SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof(patience));
+        return {RawSocket(UniqueFd(ends[0])), UniqueFd(ends[1])};
     }
 
-    /// The end for the connection, once.
-    UniqueFd takeOther() { return std::move(other_); }
-
+    /// What a client says before its first message.
+    void authenticate() {
+        write(std::string(1, '\0') + "AUTH EXTERNAL\r\nDATA\r\nNEGOTIATE_UNIX_FD\r\nBEGIN\r\n");
+    }
     void write(const std::string& text) {
-        ASSERT_EQ(::send(own_.get(), text.data(), text.size(), MSG_NOSIGNAL),
+        ASSERT_EQ(::send(socket_.get(), text.data(), text.size(), MSG_NOSIGNAL),
                   static_cast<ssize_t>(text.size()));
     }
     void write(const WireMessage& message) {
         std::vector<int> descriptors;
         for (const UniqueFd& each : message.descriptors)
             descriptors.push_back(each.get());
-        ASSERT_EQ(sendWithDescriptors(own_.get(), message.bytes, descriptors),
-                  static_cast<ssize_t>(message.bytes.size()));
+        write(message.bytes, descriptors);
+    }
+    void write(std::span<const std::byte> bytes, const std::vector<int>& descriptors = {}) {
+        ASSERT_EQ(sendWithDescriptors(socket_.get(), bytes, descriptors), static_cast<ssize_t>(bytes.size()));
     }
 
     /// Reads until `end` has come.
@@ -57,7 +72,7 @@ class RawEnd {
         std::string text;
         while (!text.ends_with(end)) {
             char character = 0;
-            if (::recv(own_.get(), &character, 1, 0) != 1) {
+            if (::recv(socket_.get(), &character, 1, 0) != 1) {
                 ADD_FAILURE() << "the other side ended within: " << text;
                 break;
             }
@@ -75,6 +90,16 @@ class RawEnd {
         return message;
     }
 
+    /// Whether the other side has ended the connection, or does so now.
+    bool isCutOff() {
+        std::array<char, 4096> buffer;
+        ssize_t count = 1;
+        while (count > 0)
+            count = ::recv(socket_.get(), buffer.data(), buffer.size(), 0);
+        return count == 0 || errno == ECONNRESET;
+    }
+    int descriptor() const { return socket_.get(); }
+
   private:
     bool readBytes(WireMessage& message, std::size_t count) {
         while (count > 0) {
@@ -86,7 +111,7 @@ class RawEnd {
             header.msg_iovlen = 1;
             header.msg_control = control.data();
             header.msg_controllen = control.size();
-            const ssize_t received = ::recvmsg(own_.get(), &header, MSG_CMSG_CLOEXEC);
+            const ssize_t received = ::recvmsg(socket_.get(), &header, MSG_CMSG_CLOEXEC);
             if (received <= 0) {
                 ADD_FAILURE() << "no message came";
                 return false;
@@ -102,8 +127,7 @@ class RawEnd {
         return true;
     }
 
-    UniqueFd own_;
-    UniqueFd other_;
+    UniqueFd socket_;
 };
 
 }  // namespace kelvo::test

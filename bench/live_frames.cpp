@@ -1,0 +1,223 @@
+// What it costs to hand a captured frame to an application, and how soon the application has it: the daemon's
+// side of a capture in this process, an application with KelvoKit in another one, 1080x1920 at 60 frames a
+// second. Beside it, with the same rhythm, the least that two processes can do: one small datagram there and
+// one back.
+#include "ProcessorTime.h"
+#include "base/KVLog.h"
+#include "base/VideoSurfacePool.h"
+#include "ipc/KVClientProtocolTable.h"
+#include "ipc/KVClientProxy.h"
+#include "platform/linux/ipc/SocketTransport.h"
+#include "support/FakeDaemon.h"
+#include "support/TemporaryDirectory.h"
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <functional>
+#include <kelvokit/KelvoKit.h>
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
+#include <vector>
+
+namespace {
+
+using namespace kelvo;
+using Clock = std::chrono::steady_clock;
+
+constexpr std::chrono::nanoseconds kInterval{16'666'667};
+constexpr int kWarmUp = 60;
+constexpr int kFrames = 900;
+constexpr double kBoundMicroseconds = 60;
+constexpr double kBoundMilliseconds = 2;
+
+std::int64_t now() {
+    return Clock::now().time_since_epoch().count();
+}
+
+/// What one side saw; goes through a pipe as it is.
+struct Report {
+    double processor = 0;  ///< microseconds a frame
+    double median = 0;     ///< milliseconds from one side to the other
+    double late = 0;       ///< the 99th percentile of it
+    int frames = 0;
+};
+
+/// Gathers the frames behind the first ones.
+class Meter {
+  public:
+    void frame(std::int64_t sentAt) {
+        const std::int64_t age = now() - sentAt;
+        if (++seen_ == kWarmUp) startedAt_ = test::processorSeconds();
+        if (seen_ > kWarmUp && seen_ <= kWarmUp + kFrames) ages_.push_back(age);
+        if (seen_ == kWarmUp + kFrames) processor_ = test::processorSeconds() - startedAt_;
+    }
+    bool isDone() const { return seen_ >= kWarmUp + kFrames; }
+    Report report() {
+        std::ranges::sort(ages_);
+        const auto at = [&](double part) {
+            return static_cast<double>(ages_[static_cast<std::size_t>(part * (kFrames - 1))]) / 1e6;
+        };
+        return {processor_ / kFrames * 1e6, at(0.5), at(0.99), kFrames};
+    }
+
+  private:
+    std::atomic<int> seen_ = 0;
+    double startedAt_ = 0;
+    double processor_ = 0;
+    std::vector<std::int64_t> ages_;
+};
+
+/// Runs `frame` 60 times a second; the processor time of each after the first ones, in microseconds.
+double play(const std::function<bool()>& frame) {
+    auto next = Clock::now();
+    double before = 0;
+    for (int i = 0; i < kWarmUp + kFrames; ++i) {
+        if (i == kWarmUp) before = test::processorSeconds();
+        std::this_thread::sleep_until(next += kInterval);
+        if (!frame()) std::fprintf(stderr, "frame %d was skipped\n", i);
+    }
+    return (test::processorSeconds() - before) / kFrames * 1e6;
+}
+
+/// An application that captures itself and looks at nothing.
+Report application(const std::string& socket) {
+    Meter meter;
+    kelvokit::Recorder recorder({.socketPath = socket, .executor = nullptr});
+    recorder.onFrame([&](const kelvokit::Frame& frame) { meter.frame(frame.presentationTime()->count()); });
+    while (!recorder.state().isConnected) {
+        recorder.refreshState();
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    }
+    for (int i = 0; i < 3000 && !meter.isDone(); ++i)
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    std::this_thread::sleep_for(std::chrono::milliseconds(100));
+    return meter.isDone() ? meter.report() : Report();
+}
+
+Report bareReader(int socket) {
+    Meter meter;
+    std::int64_t sentAt = 0;
+    while (!meter.isDone() && ::recv(socket, &sentAt, sizeof(sentAt), 0) == sizeof(sentAt)) {
+        meter.frame(sentAt);
+        if (::send(socket, "x", 1, MSG_NOSIGNAL) != 1) break;
+    }
+    return meter.isDone() ? meter.report() : Report();
+}
+
+/// A process of its own whose report is read when it ends.
+class Other {
+  public:
+    explicit Other(const std::function<Report()>& work) {
+        if (::pipe(pipe_.data()) != 0) std::exit(1);
+        process_ = ::fork();
+        if (process_ != 0) return;
+        const Report report = work();
+        ::_exit(::write(pipe_[1], &report, sizeof(report)) == sizeof(report) ? 0 : 1);
+    }
+    Report end() const {
+        Report report;
+        if (::read(pipe_[0], &report, sizeof(report)) != sizeof(report)) std::exit(1);
+        ::waitpid(process_, nullptr, 0);
+        return report;
+    }
+
+  private:
+    std::array<int, 2> pipe_{-1, -1};
+    pid_t process_ = -1;
+};
+
+/// Keeps the one client.
+class Door : public IPCListenerDelegate {
+  public:
+    bool listenerShouldAcceptNewConnection(IPCListener&, const IPCConnectionRef& connection) override {
+        connection->setExported(interfaceOf<KVDaemonProtocol>(),
+                                std::make_shared<ProtocolDispatcher<KVDaemonProtocol>>(daemon_));
+        connection->setRemoteInterface(interfaceOf<KVClientProtocol>());
+        connection->resume();
+        client.set(connection);
+        return true;
+    }
+    Guarded<IPCConnectionRef> client;
+
+  private:
+    const std::shared_ptr<test::FakeDaemon> daemon_ = std::make_shared<test::FakeDaemon>();
+};
+
+/// Log lines are written as far as the journal; the journal's own work is not ours.
+struct Nowhere : LogSink {
+    void write(LogLevel, std::string_view) override {}
+};
+
+std::pair<double, Report> measureCapture() {
+    const test::TemporaryDirectory root;
+    const Other client([&] { return application(root.path() + "/run/kelvod/com.quillon.kelvod"); });
+    setLogSink(std::make_shared<Nowhere>());
+    SocketTransport transport(std::make_shared<const DeviceRoot>(root.path(), ""), nullptr);
+    const auto door = std::make_shared<Door>();
+    const auto listener = transport.createListener("com.quillon.kelvod");
+    listener->setDelegate(door);
+    listener->resume();
+    while (!door->client.copy())
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    std::this_thread::sleep_for(std::chrono::milliseconds(200));
+    KVClientProxy proxy(door->client.copy());
+    VideoSurfacePool pool(VideoSurface::Geometry::packed(1080, 1920), 8);
+    const double processor = play([&] {
+        const auto surface = pool.take();
+        if (!surface) return false;
+        const auto object = std::make_shared<KVIOSurfaceObject>();
+        object->setIOSurface(*surface);
+        TimingRecord timing;
+        timing.presentationTime = MediaTime::make(now(), 1'000'000'000);
+        proxy.captureHandlerWithSample(object, bytesOfRecord(timing));
+        return true;
+    });
+    return {processor, client.end()};
+}
+
+std::pair<double, Report> measureBare() {
+    std::array<int, 2> ends{-1, -1};
+    if (::socketpair(AF_UNIX, SOCK_SEQPACKET, 0, ends.data()) != 0) std::exit(1);
+    const Other reader([&] { return bareReader(ends[1]); });
+    std::thread releases([&] {
+        char byte = 0;
+        for (int i = 0; i < kWarmUp + kFrames && ::recv(ends[0], &byte, 1, 0) == 1; ++i) {
+        }
+    });
+    const double processor = play([&] {
+        const std::int64_t sentAt = now();
+        return ::send(ends[0], &sentAt, sizeof(sentAt), MSG_NOSIGNAL) == sizeof(sentAt);
+    });
+    releases.join();
+    return {processor, reader.end()};
+}
+
+void print(const char* name, double sender, const Report& receiver) {
+    std::printf(
+        "%-9s %6.1f us sender + %6.1f us receiver = %6.1f us a frame; arrives after %.3f ms, 99th percentile "
+        "%.3f ms\n",
+        name, sender, receiver.processor, sender + receiver.processor, receiver.median, receiver.late);
+}
+
+}  // namespace
+
+int main() {
+    const auto [bareSender, bareReceiver] = measureBare();
+    print("bare", bareSender, bareReceiver);
+    const auto [sender, receiver] = measureCapture();
+    if (receiver.frames == 0) return std::puts("not every frame arrived"), 1;
+    print("KelvoKit", sender, receiver);
+    const double cost = sender + receiver.processor;
+    std::printf(
+        "processor %.1f us a frame (bound %.0f), %.2f times the bare hand-over; 99th percentile %.3f ms "
+        "(bound %.0f), %.2f times\n",
+        cost, kBoundMicroseconds, cost / (bareSender + bareReceiver.processor), receiver.late,
+        kBoundMilliseconds, receiver.late / bareReceiver.late);
+    return cost <= kBoundMicroseconds && receiver.late <= kBoundMilliseconds ? 0 : 1;
+}
