@@ -2,6 +2,8 @@
 #include "daemon/KVRecordingManager.h"
 #include "ipc/KVClientProxyFactory.h"
 
+#include <algorithm>
+
 namespace kelvo {
 namespace {
 
@@ -42,13 +44,23 @@ void KVRecordingManager::stopRecordingWithStartClipDuration(double startClipDura
 }
 
 void KVRecordingManager::saveVideoToCameraRoll(const URL& movieURL, ErrorHandler handler) {
-    // A saved movie is deleted: what is not the daemon's own must not come to that.
-    if (!KVTemporaryFileStore::isInStore(movieURL)) {
-        KVLogError("KVRecordingManager: saveVideoToCameraRoll: not a movie of the store");
+    if (!mayCallerSave(movieURL)) {
+        KVLogError("KVRecordingManager: saveVideoToCameraRoll: not a movie that this client may save");
         if (handler) handler(errors_->kvUserErrorForCode(kRecordingErrorFailedToSave));
         return;
     }
     saveVideoToCameraRoll(std::optional(movieURL), std::move(handler));
+}
+
+/// A saved movie is deleted: what is not the daemon's own, or is still being recorded, must not come to that.
+/// An application has its own movies, the system's shell all of them.
+bool KVRecordingManager::mayCallerSave(const URL& movieURL) const {
+    if (!KVTemporaryFileStore::nameInStore(movieURL)) return false;
+    const auto active = sessionManager_->getActiveRecordingSessions();
+    if (std::ranges::any_of(active, [&](const auto& each) { return each->isWritingMovie(movieURL); }))
+        return false;
+    const SessionRef session = getCallingConnectionRecordingSession();
+    return clientHasSystemEntitlements() || (session && session->ownsMovie(movieURL));
 }
 
 void KVRecordingManager::pauseRecording() {

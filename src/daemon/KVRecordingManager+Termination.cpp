@@ -38,11 +38,4 @@ void KVRecordingManager::finishRecording(const SessionRef& session, const WorkRe
         });
 }
 
-void KVRecordingManager::logMoviesLeftBehind() {
-    const std::size_t count = fileStore_->movies().size();
-    if (count == 0) return;
-    KVLog("KVRecordingManager: %zu unsaved movies lie in the store; \"kelvoctl library recover\" saves them",
-          count);
-}
-
 }  // namespace kelvo

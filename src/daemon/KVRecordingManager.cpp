@@ -35,7 +35,6 @@ KVRecordingManager::KVRecordingManager(const Platform& platform, SessionFactory 
 /// give.
 void KVRecordingManager::registerWithPlatform() {
     fileStore_->_srSetupTempDirectory();
-    logMoviesLeftBehind();
     connectionManager_ = std::make_shared<KVConnectionManager>(platform_.ipc, localization_);
     connectionManager_->setDelegate(weak_from_this());
     publicListener_ = platform_.ipc->createListener(kServiceName);

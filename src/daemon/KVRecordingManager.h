@@ -279,7 +279,7 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
     }
     void finishRecordings(const WorkRef& work);
     void finishRecording(const SessionRef& session, const WorkRef& work);
-    void logMoviesLeftBehind();
+    bool mayCallerSave(const URL& movieURL) const;
 
     const Platform platform_;
     const std::shared_ptr<KVLocalization> localization_;

@@ -12,8 +12,6 @@ namespace kelvo {
 namespace {
 
 constexpr std::string_view kMovieSuffix = ".mp4";
-/// What mixing was making when the daemon ended; the movie that it was made from is there, too.
-constexpr std::string_view kMixPrefix = "KVKelvo_Final";
 constexpr std::string_view kTrimmedSuffix = "_trimmed.mp4";
 
 std::string pathInStore(const std::string& name) {
@@ -22,7 +20,8 @@ std::string pathInStore(const std::string& name) {
 
 /// Whether `name` is what became, or was becoming, of another of those movies.
 bool isMadeFromAnother(const std::string& name, const std::map<std::string, FileAttributes>& all) {
-    if (name.starts_with(kMixPrefix)) return true;
+    // What mixing was making when the daemon ended: the movie that it was made from is there, too.
+    if (name.starts_with(KVTemporaryFileStore::kMixedMoviePrefix)) return true;
     if (!name.ends_with(kTrimmedSuffix)) return false;
     const std::string stem = name.substr(0, name.size() - kTrimmedSuffix.size());
     return all.contains(stem + std::string(kMovieSuffix));

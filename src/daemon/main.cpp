@@ -8,6 +8,7 @@
 #include "platform/linux/log/StderrLog.h"
 #include "platform/linux/system/DescriptorLimit.h"
 #include "platform/linux/system/InstanceLock.h"
+#include "platform/linux/system/MemoryUse.h"
 #include "platform/linux/system/Resources.h"
 #include "platform/linux/system/TerminationSignals.h"
 #include "session/KVRecordingSession.h"
@@ -39,6 +40,7 @@ int cannotUseRoot(const Options& options, const KVError& error) {
 }
 
 int run(const Options& options) {
+    giveMemoryBackEarly();
     std::atomic<bool> isTerminated{false};
     TerminationSignals signals;
     ::umask(S_IRWXG | S_IRWXO);  // recordings are their owner's alone

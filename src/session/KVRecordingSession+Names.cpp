@@ -35,6 +35,17 @@ std::string KVRecordingSession::outputPath() const {
     return directory + localizedAppName() + ".mp4";
 }
 
+bool KVRecordingSession::ownsMovie(const URL& movieURL) const {
+    const auto name = KVTemporaryFileStore::nameInStore(movieURL);
+    return name && (name == localizedAppName() + ".mp4" || name == localizedAppName() + "_trimmed.mp4");
+}
+
+bool KVRecordingSession::isWritingMovie(const URL& movieURL) const {
+    const auto writer = movieWriter();
+    const auto name = KVTemporaryFileStore::nameInStore(movieURL);
+    return recording_ && writer && name && name == KVTemporaryFileStore::nameInStore(writer->outputURL());
+}
+
 std::string KVRecordingSession::trimmedOutputPath() const {
     return KVTemporaryFileStore::_srTempPath() + "/" + localizedAppName() + "_trimmed.mp4";
 }

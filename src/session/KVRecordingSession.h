@@ -119,6 +119,8 @@ class KVRecordingSession : public RecordingSession,
     }
     std::optional<Dictionary> extensionInfo() const override { return extensionInfo_.copy(); }
     std::optional<URL> interruptedMovieURL() const override { return interruptedMovieURL_.copy(); }
+    bool ownsMovie(const URL& movieURL) const override;
+    bool isWritingMovie(const URL& movieURL) const override;
 
     /// What the client wants its extension to know.
     std::optional<Dictionary> broadcastUserInfo() const { return broadcastUserInfo_.copy(); }

@@ -45,6 +45,10 @@ class RecordingSession : public KVApplicationStateObserver, public KVSystemState
     virtual bool isCapturing() const = 0;
     virtual std::optional<Dictionary> extensionInfo() const = 0;
     virtual std::optional<URL> interruptedMovieURL() const = 0;
+    /// Whether a movie of the store has the name of this client's own.
+    virtual bool ownsMovie(const URL& movieURL) const = 0;
+    /// Whether that movie is being recorded now.
+    virtual bool isWritingMovie(const URL& movieURL) const = 0;
     /// None unless the session broadcasts.
     virtual std::shared_ptr<BroadcastExtensionLink> broadcastExtension() const = 0;
 

@@ -39,19 +39,11 @@ std::string KVTemporaryFileStore::_srTempPath() {
     return std::string(kStorePath);
 }
 
-bool KVTemporaryFileStore::isInStore(const URL& url) {
+std::optional<std::string> KVTemporaryFileStore::nameInStore(const URL& url) {
     const std::filesystem::path path = std::filesystem::path(url.path()).lexically_normal();
-    return path.has_filename() && path.filename() != ".." &&
-           path.parent_path() == std::filesystem::path(kStorePath).parent_path();
-}
-
-std::vector<URL> KVTemporaryFileStore::movies() {
-    std::vector<URL> found;
-    for (const std::string& name : fileSystem_->namesInDirectory(kStorePath).valueOr({})) {
-        if (name.ends_with(".mp4") && !name.starts_with(kMixedMoviePrefix))
-            found.push_back(URL::file(pathInStore(name)));
-    }
-    return found;
+    const bool isThere = path.has_filename() && path.filename() != ".." &&
+                         path.parent_path() == std::filesystem::path(kStorePath).parent_path();
+    return isThere ? std::optional(path.filename().string()) : std::nullopt;
 }
 
 void KVTemporaryFileStore::_srSetupTempDirectory() {

@@ -30,12 +30,9 @@ class KVTemporaryFileStore {
     /// How the names of mixed movies begin.
     static constexpr std::string_view kMixedMoviePrefix = "KVKelvo_Final";
 
-    /// Whether the URL is that of a file in the store, whether or not there is one.
-    static bool isInStore(const URL& url);
-
-    /// The movies that lie in the store and can be saved: not those that a mix had just begun to write. In
-    /// alphabetical order; none when the store cannot be read. Caller's thread.
-    std::vector<URL> movies();
+    /// The name of the store's file at this URL, whether or not there is one; none when the URL leads
+    /// elsewhere.
+    static std::optional<std::string> nameInStore(const URL& url);
 
     /// Creates the directory when nothing stands at its path. Caller's thread.
     void _srSetupTempDirectory();

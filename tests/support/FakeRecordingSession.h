@@ -44,6 +44,8 @@ class FakeRecordingSession : public RecordingSession {
     bool isCapturing() const override { return capturing; }
     std::optional<Dictionary> extensionInfo() const override { return extension; }
     std::optional<URL> interruptedMovieURL() const override { return interruptedMovie; }
+    bool ownsMovie(const URL& movieURL) const override { return movieURL == ownMovie; }
+    bool isWritingMovie(const URL& movieURL) const override { return recording && movieURL == ownMovie; }
     std::shared_ptr<BroadcastExtensionLink> broadcastExtension() const override { return nullptr; }
 
     void setBroadcasting(bool isBroadcasting) override {
@@ -163,6 +165,7 @@ class FakeRecordingSession : public RecordingSession {
     std::shared_ptr<FakeClientProxy> client = std::make_shared<FakeClientProxy>();
     std::optional<Dictionary> extension;
     std::optional<URL> interruptedMovie;
+    std::optional<URL> ownMovie;
 
     // What a start set.
     bool capturing = false;

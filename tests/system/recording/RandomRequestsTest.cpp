@@ -29,12 +29,12 @@ class RandomRequestsTest : public RecordingFixture {
     /// One client's life, and that of those that come after it.
     void live(const Start& start, unsigned seed, std::chrono::steady_clock::time_point end) {
         Random random(seed);
-        auto client = start();
+        auto client = startOne(start);
         while (std::chrono::steady_clock::now() < end) {
             const int mind = below(random, 100);
             if (mind < 1) {
                 client->kill();
-                client = start();
+                client = startOne(start);
             } else if (mind < 15) {
                 startSomething(random, *client);
             } else if (mind < 18) {
@@ -46,6 +46,11 @@ class RandomRequestsTest : public RecordingFixture {
             ++fired_;
             pass(std::chrono::milliseconds(below(random, 20)));
         }
+    }
+    /// One after the other: a program cannot be run while a process forked meanwhile has it open to write.
+    std::unique_ptr<ClientProcess> startOne(const Start& start) {
+        const std::lock_guard lock(startMutex_);
+        return start();
     }
     static void startSomething(Random& random, const ClientProcess& client) {
         const auto isTrue = [&] { return below(random, 2) == 0; };
@@ -66,6 +71,7 @@ class RandomRequestsTest : public RecordingFixture {
     }
 
     const std::vector<DaemonRequest> requests_ = daemonRequests();
+    std::mutex startMutex_;
     std::atomic<int> fired_{0};
 };
 

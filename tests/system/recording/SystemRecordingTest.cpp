@@ -54,8 +54,8 @@ TEST_F(SoundRecordingTest, ScreenMicrophoneAndApplicationAreInTheSavedMovie) {
     EXPECT_EQ(stopped->code, 0);
     EXPECT_GT(countedIn(stopped->movie), 30U);
     EXPECT_EQ(probeStream(stopped->movie, "v:0", "width,height"), "320,480");
-    EXPECT_GT(amplitude(stopped->movie, "a:1", 440), 2000) << "the microphone";
-    EXPECT_GT(amplitude(stopped->movie, "a:0", 880), 2000) << "the application";
+    EXPECT_GT(amplitude(stopped->movie, "a:1", 440), 500) << "the microphone";
+    EXPECT_GT(amplitude(stopped->movie, "a:0", 880), 500) << "the application";
     EXPECT_EQ(client->save(stopped->movie), 0) << log();
     ASSERT_EQ(library().size(), 1U);
     EXPECT_GT(countedIn(library().front()), 30U);
@@ -179,7 +179,7 @@ TEST_F(SystemRecordingTest, KilledDaemonLeavesAMovieThatPlaysAndTheNextOneSaysSo
     EXPECT_GT(countedIn(store().front()), 10U);
     std::filesystem::remove(socket());
     startDaemon();
-    EXPECT_TRUE(logs("1 unsaved movies lie in the store"));
+    EXPECT_TRUE(logs("movies of an earlier run lie in the store: 1;"));
     const auto client = shell();
     EXPECT_EQ(client->save(store().front()), 0) << log();
     ASSERT_EQ(library().size(), 1U);

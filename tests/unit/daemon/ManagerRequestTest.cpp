@@ -257,6 +257,37 @@ TEST_F(ManagerRequestTest, OnlyWhatLiesInTheStoreIsSavedAndDeleted) {
     EXPECT_THAT(device.alerts->shownAlerts(), IsEmpty()) << "the user has nothing to do with it";
 }
 
+TEST_F(ManagerRequestTest, ApplicationSavesItsOwnFinishedMovieAndTheShellEveryOne) {
+    const URL movie = URL::file("/private/var/mobile/Library/KelvoKit/App.mp4");
+    const auto isSaved = [&] {
+        device.fileSystem->addFile(movie.path(), 1);
+        device.media->addMovie(movie, {});
+        std::atomic<bool> isAnswered = false;
+        OptionalError error;
+        manager->saveVideoToCameraRoll(movie, [&](const OptionalError& e) {
+            error = e;
+            isAnswered = true;
+        });
+        while (!isAnswered) {
+            device.settle();
+            std::this_thread::yield();
+        }
+        return !error;
+    };
+    EXPECT_FALSE(isSaved()) << "a client without a session";
+    const auto found = session("com.example.app");
+    EXPECT_FALSE(isSaved()) << "another application's";
+    found->ownMovie = movie;
+    EXPECT_TRUE(isSaved());
+    found->recording = true;
+    EXPECT_FALSE(isSaved()) << "it is being recorded";
+    found->recording = false;
+    found->ownMovie.reset();
+    device.ipc->setCurrentConnection(
+        std::make_shared<SimulatedConnection>(11, Dictionary{{"com.quillon.private.kelvo-kit", true}}));
+    EXPECT_TRUE(isSaved()) << "the shell";
+}
+
 TEST_F(ManagerRequestTest, DiscardOfACallerWithoutASessionIsAnswered) {
     int answers = 0;
     manager->discardRecordingWithHandler([&] { ++answers; });

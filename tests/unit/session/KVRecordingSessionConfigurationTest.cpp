@@ -118,6 +118,23 @@ TEST_F(SessionFixture, TrimmedMovieIsNamedAfterTheApplicationInEveryCase) {
     EXPECT_EQ(session->trimmedOutputPath(), std::string(kStore) + "Paint_trimmed.mp4");
 }
 
+TEST_F(SessionFixture, MoviesUnderTheApplicationsNameAreItsOwn) {
+    EXPECT_TRUE(session->ownsMovie(session->outputURL()));
+    EXPECT_TRUE(session->ownsMovie(session->trimmedOutputURL()));
+    EXPECT_TRUE(session->ownsMovie(URL::file("/private/var/mobile/Library/KelvoKit/Paint.mp4")));
+    for (const char* other : {"/private/var/mobile/Library/KelvoKit/Other.mp4", "/home/Paint.mp4", ""})
+        EXPECT_FALSE(session->ownsMovie(URL::file(other))) << other;
+}
+
+TEST_F(SessionFixture, MovieIsBeingWrittenWhileItsSessionRecords) {
+    EXPECT_FALSE(session->isWritingMovie(session->outputURL()));
+    start();
+    EXPECT_TRUE(session->isWritingMovie(session->outputURL()));
+    EXPECT_FALSE(session->isWritingMovie(session->trimmedOutputURL()));
+    session->setRecording(false);
+    EXPECT_FALSE(session->isWritingMovie(session->outputURL()));
+}
+
 TEST_F(SessionFixture, ApplicationsNameCannotLeaveTheStore) {
     SimulatedBundleContent evil;
     evil.bundleIdentifier = "com.example.evil";
