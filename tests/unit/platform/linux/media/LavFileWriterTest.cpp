@@ -1,6 +1,7 @@
 #include "MovieFixture.h"
 #include "platform/MediaErrors.h"
 #include "platform/MediaSettings.h"
+#include "support/Eventually.h"
 
 #include <cmath>
 #include <cstdlib>
@@ -306,6 +307,14 @@ TEST_F(LavFileWriterTest, UnfinishedMoviePlaysUpToItsLastFragment) {
     EXPECT_EQ(boxTypes(path).substr(0, 24), "ftyp moov free moof mdat");
     EXPECT_EQ(decodingComplaints(path), "");
     EXPECT_GT(frameTimes(path, "v:0").back(), 2);
+}
+
+TEST_F(LavFileWriterTest, FrameAfterWhichNothingMovesIsWrittenAllTheSame) {
+    TestMovie movie(service, path, {.hasAudio1 = false, .hasAudio2 = false});
+    ASSERT_TRUE(movie.start());
+    ASSERT_TRUE(movie.appendWhenReady(movie.video(), testFrame({320, 240}, 0, movie.timeAt(0))));
+    EXPECT_TRUE(eventually([&] { return boxTypes(path) == "ftyp moov free moof mdat"; }));
+    EXPECT_EQ(frameTimes(path, "v:0").size(), 1U);
 }
 
 TEST_F(LavFileWriterTest, FragmentsAreAtMostASecondLong) {
