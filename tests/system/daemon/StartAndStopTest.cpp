@@ -4,6 +4,8 @@
 #include <array>
 #include <csignal>
 #include <filesystem>
+#include <fstream>
+#include <string>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <unistd.h>
@@ -48,6 +50,19 @@ TEST_F(StartAndStopTest, EndsCleanlyOnSigint) {
     ASSERT_TRUE(daemon.waitForLine("_srSetupTempDirectory"));
     daemon.signal(SIGINT);
     EXPECT_EQ(daemon.waitForExit(), 0);
+}
+
+TEST_F(StartAndStopTest, MayHaveAsManyDescriptorsAsTheSystemLetsIt) {
+    const std::string script =
+        "ulimit -Sn 300; ulimit -Hn 2000; exec " KELVOD_PROGRAM " --root " + root.path() + " --log stderr";
+    test::ChildProcess daemon({"sh", "-c", script}, {{"DBUS_SYSTEM_BUS_ADDRESS", "unix:path=/nonexistent"}});
+    ASSERT_TRUE(daemon.waitForLine("_srSetupTempDirectory")) << daemon.output();
+    std::ifstream limits("/proc/" + std::to_string(daemon.processIdentifier()) + "/limits");
+    std::string line;
+    while (std::getline(limits, line) && !line.starts_with("Max open files")) {
+    }
+    EXPECT_NE(line.find(" 2000 "), std::string::npos) << line;
+    EXPECT_EQ(line.find(" 300 "), std::string::npos) << line;
 }
 
 TEST_F(StartAndStopTest, SecondDaemonOnTheSameRootIsRefused) {

@@ -248,6 +248,24 @@ TEST_F(MovieLibraryTest, IndexCutShortIsAnErrorAndEveryFileStays) {
     EXPECT_EQ(files(), before);
 }
 
+TEST_F(MovieLibraryTest, IndexThatSomebodyKeepsLockedIsAnErrorThatLosesNothing) {
+    const auto identifier = library.add(movie("a.mp4", "1"));
+    sqlite3* holder = nullptr;
+    sqlite3_open((folder + "/.library.sqlite").c_str(), &holder);
+    ASSERT_EQ(sqlite3_exec(holder, "BEGIN EXCLUSIVE", nullptr, nullptr, nullptr), SQLITE_OK);
+    const auto before = files();
+    const auto result = library.add(movie("b.mp4", "2"));
+    ASSERT_FALSE(result);
+    EXPECT_EQ(result.error().code(), EBUSY);
+    EXPECT_EQ(files(), before);
+    EXPECT_EQ(contentOf(store.path() + "/b.mp4"), "2");
+    sqlite3_exec(holder, "ROLLBACK", nullptr, nullptr, nullptr);
+    sqlite3_close(holder);
+    EXPECT_TRUE(library.add(store.path() + "/b.mp4"));
+    EXPECT_EQ(library.remove(*identifier), std::nullopt);
+    EXPECT_EQ(library.movies()->size(), 1U);
+}
+
 TEST_F(MovieLibraryTest, ForeignDatabaseIsRefused) {
     fs::create_directories(folder);
     executeInIndex("CREATE TABLE other (x)");
