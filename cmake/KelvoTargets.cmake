@@ -28,6 +28,12 @@ if(KELVO_FUZZ)
     target_compile_options(kelvo_settings INTERFACE -fsanitize=fuzzer-no-link)
 endif()
 
+# kelvo_compile_alone(FILE...): in the builds that compile a folder's files together, these files of the current folder
+# stay apart: names that they keep to themselves are those of a neighbour's.
+function(kelvo_compile_alone)
+    set_source_files_properties(${ARGN} PROPERTIES SKIP_UNITY_BUILD_INCLUSION ON)
+endfunction()
+
 # kelvo_library(NAME [DEPENDS target...]): the static library of the current folder, from all its sources.
 function(kelvo_library name)
     cmake_parse_arguments(ARG "" "" "DEPENDS" ${ARGN})

@@ -9,10 +9,13 @@
 #include <cerrno>
 #include <climits>
 #include <cstddef>
+#include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
 #include <memory>
 #include <poll.h>
+#include <string_view>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <thread>
@@ -75,17 +78,40 @@ struct XauFree {
     void operator()(Xauth* entry) const { XauDisposeAuth(entry); }
 };
 
+struct FileClose {
+    void operator()(std::FILE* file) const { std::fclose(file); }
+};
+
+std::string authorityPath() {
+    // NOLINTBEGIN(concurrency-mt-unsafe): nothing changes the environment once threads run
+    const char* const path = std::getenv("XAUTHORITY");
+    if (path != nullptr && *path != '\0') return path;
+    const char* const home = std::getenv("HOME");
+    // NOLINTEND(concurrency-mt-unsafe)
+    return std::string(home == nullptr ? "" : home) + "/.Xauthority";
+}
+
+bool isFor(const Xauth& entry, std::string_view host, std::string_view display) {
+    const bool isHere =
+        entry.family == FamilyWild ||
+        (entry.family == FamilyLocal && std::string_view(entry.address, entry.address_length) == host);
+    const std::string_view number(entry.number, entry.number_length);
+    return isHere && (number.empty() || number == display) &&
+           std::string_view(entry.name, entry.name_length) == kCookie;
+}
+
 /// What the server of that number wants to see of those who may connect; none when nobody left it for us.
+/// Entry by entry, as libXau's own search keeps the file's name in one place for all threads.
 std::unique_ptr<Xauth, XauFree> cookieFor(int number) {
     std::array<char, HOST_NAME_MAX + 1> host{};
     if (::gethostname(host.data(), host.size() - 1) != 0) return nullptr;
     const std::string display = std::to_string(number);
-    std::string cookie = kCookie;
-    std::array<char*, 1> names{cookie.data()};
-    std::array<int, 1> lengths{static_cast<int>(cookie.size())};
-    return std::unique_ptr<Xauth, XauFree>(XauGetBestAuthByAddr(
-        FamilyLocal, static_cast<unsigned short>(std::strlen(host.data())), host.data(),
-        static_cast<unsigned short>(display.size()), display.c_str(), 1, names.data(), lengths.data()));
+    const std::unique_ptr<std::FILE, FileClose> file(std::fopen(authorityPath().c_str(), "rbe"));
+    while (file) {
+        std::unique_ptr<Xauth, XauFree> entry(XauReadAuth(file.get()));
+        if (!entry || isFor(*entry, host.data(), display)) return entry;
+    }
+    return nullptr;
 }
 
 /// The server's number and the screen's; none for a server elsewhere, which could not share memory with us.
