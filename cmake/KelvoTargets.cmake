@@ -51,7 +51,8 @@ function(kelvo_test name)
     target_include_directories(${name} PRIVATE ${CMAKE_SOURCE_DIR}/tests)
     target_link_libraries(${name} PRIVATE kelvo_settings ${ARG_DEPENDS} kelvo_test_support)
     gtest_discover_tests(${name} DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 120 RUN_SERIAL ${ARG_SERIAL}
-        ENVIRONMENT TSAN_OPTIONS=suppressions=${CMAKE_SOURCE_DIR}/tests/tsan-suppressions.txt)
+        ENVIRONMENT TSAN_OPTIONS=suppressions=${CMAKE_SOURCE_DIR}/tests/tsan-suppressions.txt
+        ENVIRONMENT_MODIFICATION LSAN_OPTIONS=set:suppressions=${CMAKE_SOURCE_DIR}/tests/lsan-suppressions.txt)
 endfunction()
 
 # kelvo_loads_modules(TARGET): the program TARGET may load our modules, which use its base library: all of it is

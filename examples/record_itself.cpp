@@ -3,6 +3,7 @@
 #include <cstdio>
 #include <future>
 #include <kelvokit/KelvoKit.h>
+#include <string>
 #include <thread>
 
 int main() {
@@ -22,5 +23,7 @@ int main() {
             outcome.set_value(failure ? failure->description : movie.value_or("no movie"));
         });
     });
-    return std::puts(outcome.get_future().get().c_str()) < 0;
+    const std::string said = outcome.get_future().get();
+    XCloseDisplay(display);
+    return std::puts(said.c_str()) < 0;
 }

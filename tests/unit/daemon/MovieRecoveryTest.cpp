@@ -25,6 +25,11 @@ std::string textIn(const Dictionary& dictionary, std::string_view key) {
 /// A daemon that starts on a store in which something lies, and a shell that asks it.
 class MovieRecoveryTest : public testing::Test {
   protected:
+    ~MovieRecoveryTest() override {
+        for (const IPCConnectionRef& connection : connections)
+            connection->invalidate();
+    }
+
     struct Answer {
         std::vector<Dictionary> movies;
         OptionalError error;
