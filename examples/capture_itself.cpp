@@ -16,6 +16,13 @@ constexpr unsigned kHeight = 960;
 /// A window whose colour changes sixty times a second.
 class FlashingWindow {
   public:
+    FlashingWindow() = default;
+    ~FlashingWindow() {
+        if (display_ != nullptr) XCloseDisplay(display_);
+    }
+    FlashingWindow(const FlashingWindow&) = delete;
+    FlashingWindow& operator=(const FlashingWindow&) = delete;
+
     bool open() {
         display_ = XOpenDisplay(nullptr);
         if (display_ == nullptr) return false;

@@ -254,9 +254,9 @@ TEST_F(ClientsTest, ExampleThatCapturesItselfSeesItsFrames) {
     std::string said;
     EXPECT_TRUE(test::eventually(
         [&] {
-            ChildProcess example({"sh", "-c", R"(exec stdbuf -oL "$0" 3 1>&2)",
-                                  world.root() + "/Applications/capturer/program"},
-                                 environment());
+            ChildProcess example(
+                {"sh", "-c", R"(exec "$0" 3 1>&2)", world.root() + "/Applications/capturer/program"},
+                environment());
             const bool isDone = example.waitForExit() == 0;
             said = example.output();
             return isDone && said.find(" frames, ") != std::string::npos &&
