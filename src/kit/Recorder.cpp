@@ -6,6 +6,8 @@
 
 namespace kelvokit {
 
+// Taken as a copy, as users pass what they need no more.
+// NOLINTNEXTLINE(performance-unnecessary-value-param)
 Recorder::Recorder(RecorderOptions options) : core_(std::make_shared<Core>(localEnvironment(options))) {}
 Recorder::Recorder(std::shared_ptr<Core> core) : core_(std::move(core)) {}
 Recorder::~Recorder() {

@@ -2,6 +2,9 @@
 #include "kit/Conversions.h"
 #include "kit/RecorderCore.h"
 
+// Handlers are kept beyond the call: each is taken as a copy.
+// NOLINTBEGIN(performance-unnecessary-value-param)
+
 namespace kelvokit {
 namespace {
 
@@ -147,6 +150,7 @@ void Recorder::Core::getBroadcastExtensions(ExtensionsHandler handler) {
         const auto self = weakSelf.lock();
         if (!self) return;
         std::vector<Dictionary> found;
+        found.reserve(extensions.size());
         for (const kelvo::Dictionary& each : extensions)
             found.push_back(publicDictionary(each));
         self->post([handler, found, error = publicError(error)] { handler(found, error); });
@@ -188,3 +192,5 @@ void Recorder::Core::refreshState() {
 }
 
 }  // namespace kelvokit
+
+// NOLINTEND(performance-unnecessary-value-param)

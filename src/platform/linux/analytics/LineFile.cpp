@@ -37,8 +37,7 @@ bool endsInsideALine(const UniqueFd& file, off_t size) {
 OptionalError LineFile::append(const std::string& line) {
     std::string text = line + "\n";
     if (text.size() >= mostBytes_) return KVError::posix(EMSGSIZE, path_);
-    if (const auto error = makeWritableDirectory(std::filesystem::path(path_).parent_path().string()))
-        return error;
+    if (auto error = makeWritableDirectory(std::filesystem::path(path_).parent_path().string())) return error;
     UniqueFd file = open(path_);
     off_t size = sizeOf(file);
     if (size < 0) return KVError::posix(errno, path_);

@@ -72,7 +72,7 @@ Result<MovieLibrary::Access> MovieLibrary::Access::begin(const std::string& fold
 
 OptionalError MovieLibrary::Access::add(const UniqueFd& source, LibraryEntry entry) {
     const std::string staged = stagingPath(entry);
-    if (const OptionalError error = stageFile(source, staged)) return error;
+    if (OptionalError error = stageFile(source, staged)) return error;
     OptionalError error = syncFolder();
     if (!error) error = place(entry);
     if (!error) return std::nullopt;
@@ -90,7 +90,7 @@ OptionalError MovieLibrary::Access::place(LibraryEntry& entry) {
         entry.fileName = numbered(wanted, number);
         if (exists(path(entry))) continue;
         entry.state = State::staged;
-        if (const OptionalError error = index_.put(entry)) return error;
+        if (OptionalError error = index_.put(entry)) return error;
         const int code = renameWithoutReplacing(stagingPath(entry), path(entry));
         if (code == EEXIST) continue;
         if (code != 0) return KVError::posix(code, path(entry));
@@ -111,13 +111,13 @@ OptionalError MovieLibrary::Access::finish(LibraryEntry entry) {
 
 OptionalError MovieLibrary::Access::remove(LibraryEntry entry) {
     const State before = std::exchange(entry.state, State::removed);
-    if (const OptionalError error = index_.put(entry)) return error;
-    if (const OptionalError error = unlinkIfThere(path(entry))) {
+    if (OptionalError error = index_.put(entry)) return error;
+    if (OptionalError error = unlinkIfThere(path(entry))) {
         entry.state = before;
         index_.put(entry);
         return error;
     }
-    if (const OptionalError error = syncFolder()) return error;
+    if (OptionalError error = syncFolder()) return error;
     return index_.remove(entry.identifier);
 }
 
@@ -148,7 +148,7 @@ OptionalError MovieLibrary::Access::sweepStagedFiles() {
         if (!owner) return owner.error();
         if (*owner && (*owner)->state == State::staged) continue;
         KVLog("the movie library drops what an interrupted change left: %s", name.c_str());
-        if (const OptionalError error = unlinkIfThere(item->path().string())) return error;
+        if (OptionalError error = unlinkIfThere(item->path().string())) return error;
     }
     return code ? OptionalError(KVError::posix(code.value(), folder_)) : std::nullopt;
 }

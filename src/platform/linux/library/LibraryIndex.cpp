@@ -72,7 +72,7 @@ OptionalError LibraryIndex::prepareFile() {
     // What a damaged or foreign file says is data, and never instructions.
     sqlite3_db_config(database_.get(), SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
     sqlite3_db_config(database_.get(), SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
-    if (const OptionalError error = execute("PRAGMA synchronous = EXTRA")) return error;
+    if (OptionalError error = execute("PRAGMA synchronous = EXTRA")) return error;
     const auto application = number("PRAGMA application_id");
     if (!application) return application.error();
     const auto version = number("PRAGMA user_version");

@@ -28,7 +28,7 @@ std::string newIdentifier(Random& random) {
 OptionalError makeFolder(const std::string& folder) {
     std::error_code ignored;
     if (fs::exists(folder, ignored)) return makeWritableDirectory(folder);
-    if (const OptionalError error = makeWritableDirectory(folder)) return error;
+    if (OptionalError error = makeWritableDirectory(folder)) return error;
     const fs::path parent = fs::path(folder).parent_path();
     for (const fs::path& above : {parent, parent.parent_path()}) {
         const UniqueFd directory(::open(above.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));

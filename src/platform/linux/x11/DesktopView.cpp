@@ -1,7 +1,6 @@
 #include "platform/linux/x11/DesktopView.h"
 
 #include <algorithm>
-#include <ranges>
 #include <set>
 
 namespace kelvo::x11 {
@@ -35,10 +34,10 @@ std::size_t countSharing(const std::vector<DesktopWindow>& windows, const Deskto
     const auto active = std::ranges::find(windows, true, &DesktopWindow::isActive);
     std::vector<DesktopWindow> tiles{active != windows.end() ? *active : windows.back()};
     if (!isTile(tiles.front(), area)) return 1;
-    for (const DesktopWindow& window : windows | std::views::reverse) {
+    for (auto window = windows.rbegin(); window != windows.rend(); ++window) {
         const bool isFree =
-            std::ranges::none_of(tiles, [&](const auto& tile) { return overlap(tile, window); });
-        if (isFree && isTile(window, area)) tiles.push_back(window);
+            std::ranges::none_of(tiles, [&](const auto& tile) { return overlap(tile, *window); });
+        if (isFree && isTile(*window, area)) tiles.push_back(*window);
     }
     double filled = 0;
     std::set<std::int32_t> processes;

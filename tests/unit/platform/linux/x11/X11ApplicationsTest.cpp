@@ -5,6 +5,7 @@
 #include "platform/simulated/SimulatedDevice.h"
 #include "support/ChildProcess.h"
 #include "support/Eventually.h"
+#include "support/TemporaryDirectory.h"
 #include "support/x11/WindowManager.h"
 #include "support/x11/XClient.h"
 #include "support/x11/XvfbServer.h"
@@ -32,10 +33,15 @@ class X11ApplicationsTest : public testing::Test {
 
     /// Starts the other application with one window; its bundle is "other".
     std::unique_ptr<test::ChildProcess> startOther(const std::string& geometry) {
-        auto other = std::make_unique<test::ChildProcess>(
-            std::vector<std::string>{"xev", "-display", server_.display(), "-geometry", geometry});
+        // Its window comes when it is known whose it is: nothing tells of that afterwards.
+        const test::TemporaryDirectory folder;
+        auto other = std::make_unique<test::ChildProcess>(std::vector<std::string>{
+            "sh", "-c",
+            "while [ ! -e " + folder.path() + "/known ]; do sleep 0.01; done; exec xev -display " +
+                server_.display() + " -geometry " + geometry});
         device_.bundles->addProcess(other->processIdentifier(), "/Applications/Other.app/other");
         addBundle("/Applications/Other.app", "other");
+        folder.write("known", "");
         EXPECT_TRUE(eventually(
             [&] { return applications_.stateOfApplication("other") >= kApplicationStateForeground; }));
         return other;
