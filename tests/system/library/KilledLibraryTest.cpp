@@ -29,7 +29,7 @@ std::string contentOf(const std::string& path) {
 /// Kills a program that adds and removes movies, over and over at random moments, and looks at what it left.
 class KilledLibraryTest : public testing::Test {
   protected:
-    static constexpr int kKills = 25;
+    static constexpr int kKills = 10;
 
     void addMovies(const std::string& folder) {
         for (const char letter : {'a', 'b'}) {

@@ -1,6 +1,7 @@
 #include "RecordingFixture.h"
 #include "support/Tones.h"
 
+#include <algorithm>
 #include <sys/mount.h>
 
 namespace kelvo::test {
@@ -45,10 +46,13 @@ TEST_F(SoundRecordingTest, ScreenMicrophoneAndApplicationAreInTheSavedMovie) {
     const auto counter = application();
     const auto spoken = sound_.play(440, "micfeed");
     const auto played = sound_.play(880, "speaker", counter->processIdentifier());
+    ASSERT_TRUE(eventually([&] {
+        return std::ranges::count(sound_.answer("list short sink-inputs"), '\n') == 2;
+    })) << "both play";
     EXPECT_EQ(client->start({{}, true, false, true, false}), (StartAnswer{0, true, false})) << log();
     EXPECT_EQ(client->flag("isRecording"), true);
     EXPECT_EQ(client->flag("isSystemRecording"), true);
-    pass(2500ms);
+    pass(4000ms);
     const auto stopped = client->stop();
     ASSERT_TRUE(stopped && !stopped->movie.empty()) << log();
     EXPECT_EQ(stopped->code, 0);
