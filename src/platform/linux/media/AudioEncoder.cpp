@@ -36,7 +36,7 @@ FramePointer frameFor(const AVCodecContext& context) {
 
 Result<std::unique_ptr<AudioEncoder>> AudioEncoder::open(const AudioSettings& settings,
                                                          SampleHandler handler) {
-    silenceLav();
+    prepareLav();
     const AVCodec* codec = avcodec_find_encoder(AV_CODEC_ID_AAC);
     CodecContextPointer context = codec == nullptr ? nullptr : configuredContext(*codec, settings);
     const bool isOpen =

@@ -12,8 +12,9 @@ KVError lavError(int result, MediaErrorCode code, std::string_view what) {
     return mediaError(code, std::string(what) + ": " + text.data());
 }
 
-void silenceLav() {
+void prepareLav() {
     av_log_set_level(AV_LOG_QUIET);
+    av_max_alloc(kMostLavBytes);
 }
 
 }  // namespace kelvo

@@ -31,12 +31,17 @@ using FramePointer = std::unique_ptr<AVFrame, LavDeleter>;
 using PacketPointer = std::unique_ptr<AVPacket, LavDeleter>;
 using ResamplerPointer = std::unique_ptr<SwrContext, LavDeleter>;
 
+/// The most that libav may allocate at once. A picture of 8192x8192 takes 100 MB and the index of a movie of
+/// a day at 60 frames a second 124 MB; more is asked for only by a file that lies about how much it holds.
+constexpr std::size_t kMostLavBytes = std::size_t{256} << 20;
+
 /// The error for what a libav function returned: in the POSIX domain when it is an errno value, else with
 /// `code`.
 KVError lavError(int result, MediaErrorCode code, std::string_view what);
 
-/// The libraries' own messages are dropped: every failure comes back as an error. Called before their first
-/// use; thread-safe.
-void silenceLav();
+/// Sets the libraries up for this process: their own messages are dropped, as every failure comes back as an
+/// error, and no single allocation of theirs exceeds kMostLavBytes. Called before their first use;
+/// thread-safe.
+void prepareLav();
 
 }  // namespace kelvo

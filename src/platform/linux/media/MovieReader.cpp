@@ -44,7 +44,7 @@ MovieReader::MovieReader(FormatContextPointer context)
     : context_(std::move(context)), packet_(av_packet_alloc()) {}
 
 Result<std::unique_ptr<MovieReader>> MovieReader::open(const std::string& path) {
-    silenceLav();
+    prepareLav();
     // Looked at before it is opened: a pipe would keep its reader waiting.
     struct stat status {};
     if (::stat(path.c_str(), &status) != 0) return KVError::posix(errno, path);

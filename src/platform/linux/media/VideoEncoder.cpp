@@ -106,7 +106,7 @@ VideoEncoder::VideoEncoder(CodecContextPointer context, const VideoSettings& set
 
 Result<std::unique_ptr<VideoEncoder>> VideoEncoder::open(const VideoSettings& settings, Purpose purpose,
                                                          const Source& source) {
-    silenceLav();
+    prepareLav();
     for (const char* name : candidates(purpose)) {
         const AVCodec* codec = avcodec_find_encoder_by_name(name);
         CodecContextPointer context =
