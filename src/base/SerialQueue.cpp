@@ -1,5 +1,6 @@
 #include "base/SerialQueue.h"
 
+#include "base/SpareTime.h"
 #include "base/ThreadName.h"
 
 #include <algorithm>
@@ -206,6 +207,10 @@ void SerialQueue::retire() {
 }
 void SerialQueue::async(Task task) {
     state_->async(std::move(task), state_);
+}
+void SerialQueue::asyncOrSoon(Task task) {
+    if (!SpareTime::isThere() || !tryTakeTurn()) return async(std::move(task));
+    SpareTime::spend([state = state_, task = std::move(task)] { state->runInTurn(task); });
 }
 void SerialQueue::sync(const Task& task) {
     const std::shared_ptr<State> state = state_;  // the task may let the last reference to this queue go

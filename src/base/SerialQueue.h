@@ -29,6 +29,10 @@ class SerialQueue {
     /// Queues `task` and returns.
     void async(Task task);
 
+    /// As `async`; but when nothing runs and nothing waits, and the calling thread has time to spare after
+    /// what it does now, that thread runs the task then and there.
+    void asyncOrSoon(Task task);
+
     /// Runs `task` in its turn and returns when it has run. A `sync` onto a queue on which the caller already
     /// runs, be it through other queues' `sync`, would wait for itself: it is a bug and aborts with the
     /// queue's label.

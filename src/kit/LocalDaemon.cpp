@@ -84,9 +84,11 @@ class Timer {
     const std::shared_ptr<State> state_ = std::make_shared<State>();
 };
 
-Executor ownThread() {
+/// One at a time: on the thread that received what the daemon sent when that one can be spared, else on the
+/// queue's own.
+Executor ownQueue() {
     return [queue = std::make_shared<kelvo::SerialQueue>("kelvokit.handlers")](std::function<void()> task) {
-        queue->async(std::move(task));
+        queue->asyncOrSoon(std::move(task));
     };
 }
 
@@ -104,7 +106,7 @@ RecorderEnvironment localEnvironment(const RecorderOptions& options) {
     return {
         [path = socketPath(options)] { return transport().connectToSocket(path); },
         [timer = std::make_shared<Timer>()](auto pause, auto task) { timer->after(pause, std::move(task)); },
-        options.executor ? options.executor : ownThread(), userErrors()};
+        options.executor ? options.executor : ownQueue(), userErrors()};
 }
 
 }  // namespace kelvokit

@@ -1,4 +1,5 @@
 #include "base/SerialQueue.h"
+#include "base/SpareTime.h"
 
 #include <future>
 #include <thread>
@@ -57,6 +58,61 @@ TEST(SerialQueueTurnTest, WhoeverWaitsIsNextAfterATurn) {
     queue.runInTurn([&] { order.push_back(1); });
     waiting.join();
     EXPECT_EQ(order, (std::vector<int>{1, 2}));
+}
+
+TEST(SerialQueueTurnTest, SoonIsWhenTheThreadHasSpareTime) {
+    SerialQueue queue("test.turn");
+    std::vector<int> order;
+    std::thread::id ranOn;
+    {
+        const SpareTime spare;
+        queue.asyncOrSoon([&] {
+            EXPECT_TRUE(queue.isCurrent());
+            ranOn = std::this_thread::get_id();
+            order.push_back(2);
+        });
+        queue.asyncOrSoon([&] { order.push_back(3); });
+        order.push_back(1);
+    }
+    queue.sync([] {});
+    EXPECT_EQ(ranOn, std::this_thread::get_id());
+    EXPECT_EQ(order, (std::vector<int>{1, 2, 3}));
+}
+
+TEST(SerialQueueTurnTest, SoonIsOnTheQueuesThreadWhenNobodyHasTime) {
+    SerialQueue queue("test.turn");
+    std::thread::id ranOn = std::this_thread::get_id();
+    queue.asyncOrSoon([&] { ranOn = std::this_thread::get_id(); });
+    queue.sync([] {});
+    EXPECT_NE(ranOn, std::this_thread::get_id());
+}
+
+TEST(SerialQueueTurnTest, SoonStaysBehindWhatWaitsAlready) {
+    SerialQueue queue("test.turn");
+    std::promise<void> release;
+    std::vector<int> order;
+    queue.async([&, released = release.get_future().share()] {
+        released.wait();
+        order.push_back(1);
+    });
+    {
+        const SpareTime spare;
+        queue.asyncOrSoon([&] { order.push_back(2); });
+    }
+    release.set_value();
+    queue.sync([] {});
+    EXPECT_EQ(order, (std::vector<int>{1, 2}));
+}
+
+TEST(SerialQueueTurnTest, SpentTimeHasNoSpareTimeOfItsOwn) {
+    bool wasThere = true;
+    {
+        const SpareTime spare;
+        SpareTime::spend([&] { wasThere = SpareTime::isThere(); });
+        EXPECT_TRUE(SpareTime::isThere());
+    }
+    EXPECT_FALSE(wasThere);
+    EXPECT_FALSE(SpareTime::isThere());
 }
 
 }  // namespace

@@ -27,7 +27,7 @@ using Executor = std::function<void(std::function<void()>)>;
 struct RecorderOptions {
     /// The daemon's socket. Empty: the environment's KELVO_SOCKET, else /run/kelvod/com.quillon.kelvod.
     std::string socketPath;
-    /// Empty: a thread of the recorder's own.
+    /// Empty: threads of the library, one at a time.
     Executor executor;
 };
 

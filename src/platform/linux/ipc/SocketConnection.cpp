@@ -189,9 +189,9 @@ SocketConnection::Received SocketConnection::receiveSome(int socket) {
     if ((header.msg_flags & MSG_CTRUNC) != 0 || receivedDescriptors_.size() > kMostDescriptors * 2)
         return cutOff("more descriptors than allowed"), Received::nothing;
     incoming_.insert(incoming_.end(), buffer.begin(), buffer.begin() + count);
-    // Descriptors end a read early, with more behind them.
-    const bool isShort = static_cast<std::size_t>(count) < buffer.size() && header.msg_controllen == 0;
-    return isShort ? Received::all : Received::some;
+    // Descriptors end a read early, perhaps with more behind them: the loop reports that when it is armed
+    // again.
+    return static_cast<std::size_t>(count) < buffer.size() ? Received::all : Received::some;
 }
 
 void SocketConnection::handleReceived() {

@@ -1,5 +1,6 @@
 #include "platform/linux/ipc/SocketLoop.h"
 
+#include "base/SpareTime.h"
 #include "base/ThreadName.h"
 
 #include <algorithm>
@@ -93,8 +94,11 @@ struct SocketLoop::Shared {
 
     void runWhatIsLeft() {
         if (runner != std::this_thread::get_id()) return;
-        if (afterwards) afterwards();
-        afterwards = nullptr;
+        if (afterwards) {
+            const SpareTime spare;
+            afterwards();
+            afterwards = nullptr;
+        }
         runner = std::thread::id();
     }
 };
