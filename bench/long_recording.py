@@ -42,9 +42,9 @@ def flashes_in(movie):
     return [float(times[i].strip(",")) for i in range(1, len(bright)) if bright[i] and not bright[i - 1]]
 
 
-def beeps_in(movie):
-    """When beeps begin, in seconds of the movie."""
-    sound = array.array("h", decoded("-i", movie, "-map", "0:a:0", "-af", "aresample=async=0:first_pts=0,pan=mono|c0=c0",
+def beeps_in(movie, track):
+    """When beeps begin in the movie's sound track, in seconds of the movie."""
+    sound = array.array("h", decoded("-i", movie, "-map", f"0:a:{track}", "-af", "aresample=async=0:first_pts=0,pan=mono|c0=c0",
                                      "-ar", str(RATE), "-f", "s16le"))
     beeps, loud_until = [], -1
     for begin in range(0, len(sound), BLOCK):
@@ -76,7 +76,8 @@ def nearest(moments, moment):
 
 def steps(movie, log, begin):
     """For each punctual flash: when it is in the movie, and by how much its beep comes later."""
-    seen, heard = flashes_in(movie), beeps_in(movie)
+    seen = flashes_in(movie)
+    heard = max((beeps_in(movie, track) for track in (0, 1)), key=len)  # the other one is the microphone's
     found = []
     for flash in punctual_flashes(log):
         shown = nearest(seen, flash - begin)

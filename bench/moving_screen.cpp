@@ -50,7 +50,8 @@ int main(int argumentCount, char** arguments) {
     XClient client(arguments[1]);
     const double rate = std::atof(arguments[2]);
     const double share = std::atof(arguments[3]);
-    const auto screen = client.createWindow({0, 0, client.screenWidth(), client.screenHeight()}, 0xffffff);
+    const auto screen =
+        client.createWindow({0, 0, client.screenWidth(), client.screenHeight()}, 0xffffff, true);
     const auto counter = client.createWindow(kCounter, 0);
     // Without a window manager the focus says whose sound is recorded.
     xcb_set_input_focus(client.raw(), XCB_INPUT_FOCUS_PARENT, screen, XCB_CURRENT_TIME);

@@ -97,8 +97,10 @@ class Beeper {
 
 void flashForEver(const char* display, int width, int height, Moments& moments) {
     kelvo::test::XClient client(display);
-    const auto window = client.createWindow({0, 0, width, height}, 0);
+    const auto window = client.createWindow({0, 0, width, height}, 0, true);
     client.movePointer(0, 0);
+    // Without a window manager the focus says whose sound is recorded.
+    xcb_set_input_focus(client.raw(), XCB_INPUT_FOCUS_PARENT, window, XCB_CURRENT_TIME);
     for (int number = 0;; ++number) {
         const Time moment = moments.take();
         std::this_thread::sleep_until(moment);
