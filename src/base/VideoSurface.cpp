@@ -76,7 +76,14 @@ OptionalError VideoSurface::seal() {
     UniqueFd readOnly(::open(path.c_str(), O_RDONLY | O_CLOEXEC));
     if (!readOnly) return systemError("read-only surface descriptor");
     descriptor_ = std::move(readOnly);
+    keepsOutNewWriters_ = true;
     return std::nullopt;
+}
+
+void VideoSurface::keepOutNewWriters() {
+    if (keepsOutNewWriters_.exchange(true)) return;
+    // Refused only when it is so already.
+    ::fcntl(descriptor_.get(), F_ADD_SEALS, F_SEAL_FUTURE_WRITE);
 }
 
 std::span<std::byte> VideoSurface::writablePixels() const {

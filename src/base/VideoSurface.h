@@ -5,6 +5,7 @@
 #include "base/UniqueFd.h"
 #include "base/Value.h"
 
+#include <atomic>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -63,6 +64,10 @@ class VideoSurface : public ObjectHandle {
     /// the pixels: whoever receives the descriptor can only read. Once, before the surface is shared.
     OptionalError seal();
 
+    /// The same for a surface that was not sealed, as far as whoever has a writable descriptor allows it.
+    /// Cheap when it was done before.
+    void keepOutNewWriters();
+
   private:
     VideoSurface(UniqueFd descriptor, const Geometry& geometry, std::byte* pixels, bool isWritable);
     static Result<std::shared_ptr<VideoSurface>> map(UniqueFd descriptor, const Geometry& geometry,
@@ -72,6 +77,7 @@ class VideoSurface : public ObjectHandle {
     Geometry geometry_;
     std::byte* pixels_;
     bool isWritable_;
+    std::atomic<bool> keepsOutNewWriters_{false};
 };
 
 using VideoSurfaceRef = std::shared_ptr<VideoSurface>;

@@ -147,6 +147,41 @@ TEST_F(SurfaceLendingTest, OneMemoryFileIsMappedOnce) {
     EXPECT_EQ(client->held.copy().front()->pixels().data(), first);
 }
 
+TEST(SurfaceReturnsTest, AFewAreToldOfTogether) {
+    SurfaceReturns returns;
+    for (std::uint32_t serial = 1; serial < SurfaceReturns::kMostTogether; ++serial) {
+        returns.hold();
+        EXPECT_FALSE(returns.letGo(serial, {}));
+    }
+    returns.hold();
+    EXPECT_TRUE(returns.letGo(9, {}));
+    EXPECT_EQ(returns.take(), (std::vector<std::uint32_t>{1, 2, 3, 9}));
+    EXPECT_EQ(returns.take(), std::vector<std::uint32_t>());
+}
+
+TEST(SurfaceReturnsTest, NothingWaitsWhileOthersAreHeld) {
+    SurfaceReturns returns;
+    returns.hold();
+    returns.hold();
+    EXPECT_TRUE(returns.letGo(1, {}));
+    EXPECT_EQ(returns.take(), std::vector<std::uint32_t>{1});
+    EXPECT_FALSE(returns.letGo(2, {}));
+}
+
+TEST(SurfaceReturnsTest, TheFirstThatWaitsSaysHowLong) {
+    using Moment = SurfaceReturns::Moment;
+    SurfaceReturns returns;
+    EXPECT_EQ(returns.due(), std::nullopt);
+    const Moment start{std::chrono::seconds(1)};
+    for (std::uint32_t serial = 1; serial < 3; ++serial) {
+        returns.hold();
+        EXPECT_FALSE(returns.letGo(serial, start + std::chrono::milliseconds(serial)));
+    }
+    EXPECT_EQ(returns.due(), start + std::chrono::milliseconds(1) + SurfaceReturns::kPatience);
+    returns.take();
+    EXPECT_EQ(returns.due(), std::nullopt);
+}
+
 TEST(SurfaceCacheTest, KeepsWhatIsUsedAndDropsTheRest) {
     using Moment = SurfaceCache::Moment;
     const auto geometry = VideoSurface::Geometry::packed(8, 8);

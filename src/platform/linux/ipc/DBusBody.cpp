@@ -213,8 +213,7 @@ class BodyWriter {
         const auto* handle = value.as<std::shared_ptr<ObjectHandle>>();
         const auto surface = handle != nullptr ? std::dynamic_pointer_cast<VideoSurface>(*handle) : nullptr;
         if (!surface) return false;
-        // From here on nobody new can map the pixels to write them. Refused only when that is so already.
-        ::fcntl(surface->descriptor(), F_ADD_SEALS, F_SEAL_FUTURE_WRITE);
+        surface->keepOutNewWriters();
         const VideoSurface::Geometry& geometry = surface->geometry();
         return putDescriptor(surface->descriptor()) && put(geometry.width) && put(geometry.height) &&
                put(geometry.bytesPerRow) && put(static_cast<std::uint32_t>(geometry.pixelFormat));

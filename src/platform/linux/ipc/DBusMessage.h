@@ -33,6 +33,15 @@ struct Message {
     Bytes body;
     std::vector<UniqueFd> descriptors;
 
+    /// A reply or an error, without its content, to the message with this serial.
+    static Message replying(MessageType type, std::uint32_t serial) {
+        Message reply;
+        reply.type = type;
+        reply.flags = kNoReplyExpected;
+        reply.replySerial = serial;
+        return reply;
+    }
+
     bool wantsReply() const { return type == MessageType::call && (flags & kNoReplyExpected) == 0; }
 };
 

@@ -33,14 +33,6 @@ bool allowsObjects(const std::vector<IPCArgument>& arguments) {
         arguments, [](const IPCArgument& argument) { return argument.allowedObjects != IPCObjects::none; });
 }
 
-dbus::Message replyMessage(dbus::MessageType type, std::uint32_t serial) {
-    dbus::Message reply;
-    reply.type = type;
-    reply.flags = dbus::Message::kNoReplyExpected;
-    reply.replySerial = serial;
-    return reply;
-}
-
 }  // namespace
 
 void SocketConnection::handle(dbus::Message message) {
@@ -95,28 +87,17 @@ Result<Array> SocketConnection::readArguments(dbus::Message& message, const IPCM
     return arguments;
 }
 
-/// Answers, with nothing, when its last reference goes.
-std::shared_ptr<void> SocketConnection::answerAtTheEnd(std::uint32_t serial) {
-    const std::weak_ptr weakSelf = std::static_pointer_cast<SocketConnection>(shared_from_this());
-    // What it points to is of no interest, as long as it is something.
-    return {this, [weakSelf, serial](void*) {
-                const auto self = weakSelf.lock();
-                if (self && !self->isOver())
-                    self->sendMessage(replyMessage(dbus::MessageType::reply, serial));
-            }};
-}
-
 IPCReply SocketConnection::replyTo(std::uint32_t serial, const IPCMethod& method) {
     return [weakSelf = std::weak_ptr(std::static_pointer_cast<SocketConnection>(shared_from_this())), serial,
             name = method.name, signature = signatureOf(*method.reply)](const Array& values) {
         const auto self = weakSelf.lock();
         if (!self || self->isOver()) return;
-        dbus::Message reply = replyMessage(dbus::MessageType::reply, serial);
+        dbus::Message reply = dbus::Message::replying(dbus::MessageType::reply, serial);
         reply.member = name;
         reply.signature = signature;
         if (const OptionalError error = dbus::writeBody(values, reply)) {
             KVLogError("IPC: reply of %s cannot be sent", name.c_str());
-            reply = replyMessage(dbus::MessageType::error, serial);
+            reply = dbus::Message::replying(dbus::MessageType::error, serial);
             reply.errorName = "org.freedesktop.DBus.Error.Failed";
         }
         reply.member.clear();
@@ -144,14 +125,14 @@ void SocketConnection::handleStandardCall(const dbus::Message& message) {
 
 void SocketConnection::answer(const dbus::Message& call, const std::string& signature, const Array& values) {
     if (!call.wantsReply()) return;
-    dbus::Message reply = replyMessage(dbus::MessageType::reply, call.serial);
+    dbus::Message reply = dbus::Message::replying(dbus::MessageType::reply, call.serial);
     reply.signature = signature;
     if (!dbus::writeBody(values, reply)) sendMessage(std::move(reply));
 }
 
 void SocketConnection::answerError(const dbus::Message& call, const char* name, const std::string& text) {
     if (!call.wantsReply()) return;
-    dbus::Message reply = replyMessage(dbus::MessageType::error, call.serial);
+    dbus::Message reply = dbus::Message::replying(dbus::MessageType::error, call.serial);
     reply.errorName = name;
     reply.signature = "s";
     if (!dbus::writeBody({text}, reply)) sendMessage(std::move(reply));
@@ -225,7 +206,12 @@ std::uint32_t SocketConnection::nextSerial() {
 
 /// Queues a message. False when that passes a bound; then nothing was queued.
 bool SocketConnection::push(dbus::Message message) {
-    Outgoing outgoing{dbus::serialize(message), 0, std::move(message.descriptors)};
+    Bytes bytes = dbus::serialize(message);  // first: it counts the descriptors
+    return pushBytes(std::move(bytes), std::move(message.descriptors));
+}
+
+bool SocketConnection::pushBytes(Bytes bytes, std::vector<UniqueFd> descriptors) {
+    Outgoing outgoing{std::move(bytes), 0, std::move(descriptors)};
     if (out_.unsentBytes + outgoing.bytes.size() > ipc_bounds::kMostUnsentBytes ||
         out_.unsentDescriptors + outgoing.descriptors.size() > ipc_bounds::kMostUnsentDescriptors)
         return false;

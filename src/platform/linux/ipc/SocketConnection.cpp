@@ -136,16 +136,18 @@ void SocketConnection::noteDeadline() {
 }
 
 std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
+    std::optional<Moment> next = returnSurfacesWhenDue(now);
+    const auto noteNext = [&next](Moment moment) { next = next ? std::min(*next, moment) : moment; };
     const std::lock_guard lock(receiveMutex_);
     if (deadline_ && *deadline_ <= now) {
         deadline_.reset();
         cutOff(isAuthenticated_ ? "message half sent and held" : "no end of authentication");
         return std::nullopt;
     }
+    if (deadline_) noteNext(*deadline_);
     surfaces_.dropUnused(now);
-    if (surfaces_.empty()) return deadline_;
-    const Moment next = now + SurfaceCache::kPatience;
-    return deadline_ ? std::min(*deadline_, next) : next;
+    if (!surfaces_.empty()) noteNext(now + SurfaceCache::kPatience);
+    return next;
 }
 
 /// Ends after some rounds, so that a peer that never stops sending does not keep the loop for itself.

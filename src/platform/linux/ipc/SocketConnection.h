@@ -63,7 +63,8 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
         std::map<std::uint32_t, std::pair<ReplyIdentifier, std::size_t>>
             awaited;  // by serial; and the method
         std::map<std::uint32_t, LentSurfaces>
-            lent;  // by the serial of the message that the peer has yet to let go
+            lent;                // by the serial of the message that the peer has yet to let go
+        SurfaceReturns returns;  // what this side has let go of
     };
     enum class Flushed { all, some };
     using Socket = std::shared_ptr<UniqueFd>;
@@ -87,15 +88,19 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     void handleReply(dbus::Message message);
     Result<Array> readArguments(dbus::Message& message, const IPCMethod& description);
     std::shared_ptr<void> answerAtTheEnd(std::uint32_t serial);
+    void letGo(std::uint32_t serial);
+    std::optional<Moment> returnSurfacesWhenDue(Moment now);
     IPCReply replyTo(std::uint32_t serial, const IPCMethod& method);
     void answer(const dbus::Message& call, const std::string& signature, const Array& values);
     void answerError(const dbus::Message& call, const char* name, const std::string& text);
     void sendMessage(dbus::Message message);
     OptionalError sendCall(dbus::Message message, ReplyIdentifier identifier, std::size_t method,
                            LentSurfaces surfaces);
-    // Both under `outMutex_`.
+    // All under `outMutex_`.
     std::uint32_t nextSerial();
     bool push(dbus::Message message);
+    bool pushBytes(Bytes bytes, std::vector<UniqueFd> descriptors);
+    bool pushReturns();
     void afterPush(bool isWithinBounds);
     Flushed flush(int socket);
 

@@ -43,6 +43,17 @@ void tieSurfacesTo(const std::shared_ptr<void>& lease, const std::vector<IPCArgu
     }
 }
 
+bool SurfaceReturns::letGo(std::uint32_t serial, Moment now) {
+    waiting_.push_back(serial);
+    if (!due_) due_ = now + kPatience;
+    return --held_ > 0 || waiting_.size() >= kMostTogether;
+}
+
+std::vector<std::uint32_t> SurfaceReturns::take() {
+    due_.reset();
+    return std::exchange(waiting_, {});
+}
+
 Result<VideoSurfaceRef> SurfaceCache::open(UniqueFd descriptor, const VideoSurface::Geometry& geometry,
                                            Moment now) {
     struct stat status {};

@@ -7,7 +7,9 @@
 
 #include <chrono>
 #include <cstddef>
+#include <cstdint>
 #include <memory>
+#include <optional>
 #include <sys/types.h>
 #include <vector>
 
@@ -24,6 +26,33 @@ LentSurfaces surfacesIn(const std::vector<IPCArgument>& description, const Array
 /// of them.
 void tieSurfacesTo(const std::shared_ptr<void>& lease, const std::vector<IPCArgument>& description,
                    Array& arguments);
+
+/// The messages of a peer whose surfaces this side has let go of without having said so. Whoever sends one
+/// frame after the other needs none of them back at once, so it is told of a few together and woken once for
+/// them; but without delay while this side holds on to others, as then its pool may run dry. Under the
+/// owner's lock.
+class SurfaceReturns {
+  public:
+    using Moment = std::chrono::steady_clock::time_point;
+
+    static constexpr std::size_t kMostTogether = 4;
+    /// How long one waits for the others.
+    static constexpr std::chrono::milliseconds kPatience{250};
+
+    /// A message with surfaces came.
+    void hold() { ++held_; }
+    /// The surfaces of the message with this serial are let go of. True when the peer is to be told now.
+    bool letGo(std::uint32_t serial, Moment now);
+    /// The serials of which the peer is to be told. None waits any more.
+    std::vector<std::uint32_t> take();
+    /// When the peer is to be told of those that wait.
+    std::optional<Moment> due() const { return due_; }
+
+  private:
+    std::size_t held_ = 0;
+    std::vector<std::uint32_t> waiting_;
+    std::optional<Moment> due_;
+};
 
 /// The surfaces that a peer sent lately, so that each of its pool's is mapped and checked once and not for
 /// every frame. One thread's.

@@ -1,0 +1,58 @@
+#include "platform/linux/ipc/SocketConnection.h"
+
+#include <utility>
+
+namespace kelvo {
+
+/// Answers, with nothing, when its last reference goes.
+std::shared_ptr<void> SocketConnection::answerAtTheEnd(std::uint32_t serial) {
+    if (side_ == Side::client) {
+        const std::lock_guard lock(outMutex_);
+        out_.returns.hold();
+    }
+    const std::weak_ptr weakSelf = std::static_pointer_cast<SocketConnection>(shared_from_this());
+    // What it points to is of no interest, as long as it is something.
+    return {this, [weakSelf, serial](void*) {
+                const auto self = weakSelf.lock();
+                if (self && !self->isOver()) self->letGo(serial);
+            }};
+}
+
+/// Only a client is sent one frame after the other; a server's peer may wait for this very answer.
+void SocketConnection::letGo(std::uint32_t serial) {
+    if (side_ == Side::server) return sendMessage(dbus::Message::replying(dbus::MessageType::reply, serial));
+    const Moment now = loop_->now();
+    std::unique_lock lock(outMutex_);
+    if (!out_.returns.letGo(serial, now)) {
+        lock.unlock();
+        return loop_->tickAt(now + SurfaceReturns::kPatience);
+    }
+    const bool isWithinBounds = pushReturns();
+    lock.unlock();
+    afterPush(isWithinBounds);
+}
+
+/// All in one piece, so that the peer wakes up once.
+bool SocketConnection::pushReturns() {
+    Bytes bytes;
+    for (const std::uint32_t each : out_.returns.take()) {
+        dbus::Message reply = dbus::Message::replying(dbus::MessageType::reply, each);
+        reply.serial = nextSerial();
+        const Bytes one = dbus::serialize(reply);
+        bytes.insert(bytes.end(), one.begin(), one.end());
+    }
+    return pushBytes(std::move(bytes), {});
+}
+
+/// When the next surfaces are due, if any wait.
+std::optional<SocketWatcher::Moment> SocketConnection::returnSurfacesWhenDue(Moment now) {
+    std::unique_lock lock(outMutex_);
+    const auto due = out_.returns.due();
+    if (!due || *due > now) return due;
+    const bool isWithinBounds = pushReturns();
+    lock.unlock();
+    afterPush(isWithinBounds);
+    return std::nullopt;
+}
+
+}  // namespace kelvo
