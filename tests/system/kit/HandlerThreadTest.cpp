@@ -23,7 +23,7 @@ using test::eventually;
 /// Recorders with the library's own threads, before a daemon that answers at once.
 class HandlerThreadTest : public testing::Test, public IPCListenerDelegate {
   protected:
-    HandlerThreadTest() {
+    void SetUp() override {
         listener->setDelegate(std::shared_ptr<IPCListenerDelegate>(anchor, this));
         listener->resume();
     }
