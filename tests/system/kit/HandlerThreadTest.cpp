@@ -20,30 +20,39 @@ namespace {
 using kelvokit::Recorder;
 using test::eventually;
 
-/// Recorders with the library's own threads, before a daemon that answers at once.
-class HandlerThreadTest : public testing::Test, public IPCListenerDelegate {
-  protected:
-    void SetUp() override {
-        listener->setDelegate(std::shared_ptr<IPCListenerDelegate>(anchor, this));
-        listener->resume();
-    }
-
+/// Lets every client in.
+class OpenDoor : public IPCListenerDelegate {
+  public:
     bool listenerShouldAcceptNewConnection(IPCListener&, const IPCConnectionRef& connection) override {
         connection->setExported(interfaceOf<KVDaemonProtocol>(),
-                                std::make_shared<ProtocolDispatcher<KVDaemonProtocol>>(daemon));
+                                std::make_shared<ProtocolDispatcher<KVDaemonProtocol>>(daemon_));
         connection->setRemoteInterface(interfaceOf<KVClientProtocol>());
         connection->resume();
         client.set(connection);
         return true;
     }
 
+    Guarded<IPCConnectionRef> client;
+
+  private:
+    const std::shared_ptr<test::FakeDaemon> daemon_ = std::make_shared<test::FakeDaemon>();
+};
+
+/// Recorders with the library's own threads, before a daemon that answers at once.
+class HandlerThreadTest : public testing::Test {
+  protected:
+    HandlerThreadTest() {
+        listener->setDelegate(door);
+        listener->resume();
+    }
+
     /// A recorder that is connected.
     std::unique_ptr<Recorder> recorder() {
-        client.set(nullptr);
+        door->client.set(nullptr);
         auto made =
             std::make_unique<Recorder>(kelvokit::RecorderOptions{.socketPath = socket, .executor = {}});
         EXPECT_TRUE(isAnswered(*made));
-        EXPECT_TRUE(eventually([this] { return client.copy() != nullptr; }));
+        EXPECT_TRUE(eventually([this] { return door->client.copy() != nullptr; }));
         return made;
     }
     static bool isAnswered(Recorder& recorder) {
@@ -54,7 +63,7 @@ class HandlerThreadTest : public testing::Test, public IPCListenerDelegate {
     }
     /// Tells the latest recorder so often what time it is.
     void tick(int count) {
-        RemoteClient told = remoteClient(*client.copy(), "cannot tell");
+        RemoteClient told = remoteClient(*door->client.copy(), "cannot tell");
         for (int i = 0; i < count; ++i)
             told.recordingTimerDidUpdate(std::to_string(i));
     }
@@ -65,9 +74,7 @@ class HandlerThreadTest : public testing::Test, public IPCListenerDelegate {
 
     const test::TemporaryDirectory root;
     const std::string socket = root.path() + "/run/kelvod/com.quillon.kelvod";
-    const std::shared_ptr<test::FakeDaemon> daemon = std::make_shared<test::FakeDaemon>();
-    Guarded<IPCConnectionRef> client;
-    std::shared_ptr<int> anchor = std::make_shared<int>(0);
+    const std::shared_ptr<OpenDoor> door = std::make_shared<OpenDoor>();
     SocketTransport transport{std::make_shared<const DeviceRoot>(root.path(), ""), nullptr};
     std::shared_ptr<IPCListener> listener = transport.createListener("com.quillon.kelvod");
 };
