@@ -80,9 +80,12 @@ class SerialQueue::State {
         passToken();
     }
 
-    bool tryTakeTurn() {
+    /// `runsOn`: the thread that will run in the turn, if that is certain.
+    bool tryTakeTurn(std::thread::id runsOn = {}) {
         const std::lock_guard lock(mutex_);
-        return !std::exchange(busy_, true);
+        if (std::exchange(busy_, true)) return false;
+        turnRunsOn_ = runsOn;
+        return true;
     }
     void runInTurn(const Task& task) {
         const Running running(this);
@@ -90,6 +93,7 @@ class SerialQueue::State {
         std::unique_lock lock(mutex_);
         // What came meanwhile needs no other thread to be woken for it, as long as it is little.
         runOwnItems(lock, kMostBehindATurn);
+        turnRunsOn_ = {};
         passToken();
     }
 
@@ -101,16 +105,19 @@ class SerialQueue::State {
 
     void finish() {
         std::thread worker;
+        bool isTurnOurs = false;
         {
             std::lock_guard lock(mutex_);
             finishing_ = true;
+            isTurnOurs = turnRunsOn_ == std::this_thread::get_id();
             worker = std::move(worker_);
             workerWakes_.notify_one();
         }
         if (!worker.joinable()) return;
-        if (isCurrent()) {
-            worker.detach();  // the last reference went in one of our own tasks; the state lives on with the
-                              // thread
+        if (isTurnOurs || isCurrent()) {
+            // The last reference went in one of our own tasks, or before one that this thread is about to
+            // run: the queue's thread would wait for it. The state lives on with the thread.
+            worker.detach();
         } else {
             worker.join();
         }
@@ -186,6 +193,7 @@ class SerialQueue::State {
     std::deque<Item> items_;
     std::thread worker_;
     bool busy_ = false;
+    std::thread::id turnRunsOn_;
     bool workerHasToken_ = false;
     bool finishing_ = false;
     bool retired_ = false;
@@ -209,7 +217,8 @@ void SerialQueue::async(Task task) {
     state_->async(std::move(task), state_);
 }
 void SerialQueue::asyncOrSoon(Task task) {
-    if (!SpareTime::isThere() || !tryTakeTurn()) return async(std::move(task));
+    if (!SpareTime::isThere() || !state_->tryTakeTurn(std::this_thread::get_id()))
+        return async(std::move(task));
     SpareTime::spend([state = state_, task = std::move(task)] { state->runInTurn(task); });
 }
 void SerialQueue::sync(const Task& task) {

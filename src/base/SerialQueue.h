@@ -19,7 +19,7 @@ class SerialQueue {
     explicit SerialQueue(std::string label);
 
     /// Runs what is still queued, then ends the queue's thread. The last reference may go on the queue
-    /// itself.
+    /// itself, and on a thread that is to run a task of `asyncOrSoon` yet: then the rest runs later.
     ~SerialQueue();
     SerialQueue(const SerialQueue&) = delete;
     SerialQueue& operator=(const SerialQueue&) = delete;

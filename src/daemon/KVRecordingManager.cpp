@@ -81,7 +81,7 @@ void KVRecordingManager::connectBulletins() {
 
 bool KVRecordingManager::clientHasSystemEntitlements() const {
     const auto connection = connectionManager_->getCurrentConnection();
-    return connection && connection->valueForEntitlement(kSystemEntitlement).asBool().value_or(false);
+    return connection && holdsEntitlement(*connection, kSystemEntitlement);
 }
 
 std::optional<std::string> KVRecordingManager::getCallingConnectionBundleID() const {

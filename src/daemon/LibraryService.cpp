@@ -48,8 +48,7 @@ class LibraryService::Link : public KVLibraryProtocol {
   private:
     OptionalError reasonToRefuse() const {
         const auto connection = connection_.lock();
-        if (connection && connection->valueForEntitlement(kShellEntitlement).asBool().value_or(false))
-            return std::nullopt;
+        if (connection && holdsEntitlement(*connection, kShellEntitlement)) return std::nullopt;
         return KVError::posix(EPERM, "the library");
     }
 

@@ -17,7 +17,8 @@ void KVBroadcastConfigurationCoding::encodeWithCoder(const KVBroadcastConfigurat
 
 KVBroadcastConfiguration KVBroadcastConfigurationCoding::initWithCoder(const KVCoder& coder) {
     KVBroadcastConfiguration configuration;
-    if (const Value* duration = coder.decode(kClipDurationKey))
+    const Value* duration = coder.decode(kClipDurationKey);
+    if (duration != nullptr && duration->as<bool>() == nullptr)
         configuration.setClipDuration(duration->asDouble().value_or(0));
     const Value* properties = coder.decode(kPropertiesKey);
     if (properties != nullptr && properties->asDictionary() != nullptr)

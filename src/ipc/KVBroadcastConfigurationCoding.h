@@ -14,7 +14,8 @@ struct KVBroadcastConfigurationCoding {
 
     /// The clip's length always; compression properties only when there are any.
     static void encodeWithCoder(const KVBroadcastConfiguration& configuration, KVCoder& coder);
-    /// A length that is missing or no number is 0; properties that are missing or no dictionary are none.
+    /// A length that is missing or no number, as a boolean is none, is 0; one that is not finite stays so.
+    /// Properties that are missing or no dictionary are none.
     static KVBroadcastConfiguration initWithCoder(const KVCoder& coder);
 };
 

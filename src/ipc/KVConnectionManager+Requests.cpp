@@ -9,7 +9,7 @@ constexpr std::string_view kSetupEntitlement = "com.quillon.private.kelvo-kit.ca
 constexpr std::string_view kSystemEntitlement = "com.quillon.private.kelvo-kit";
 
 bool holds(const IPCConnectionRef& connection, std::string_view entitlement) {
-    return connection && connection->valueForEntitlement(entitlement).asBool().value_or(false);
+    return connection && holdsEntitlement(*connection, entitlement);
 }
 
 /// Gives `handler` the movie where the client finds it.

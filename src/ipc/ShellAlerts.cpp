@@ -101,8 +101,7 @@ bool ShellAlerts::listenerShouldAcceptNewConnection(IPCListener&, const IPCConne
 
 OptionalError ShellAlerts::registerShell(const IPCConnectionRef& connection) {
     // Looked up outside of the lock: it reads files.
-    if (!connection->valueForEntitlement(kShellEntitlement).asBool().value_or(false))
-        return KVError::posix(EPERM, "alert shell");
+    if (!holdsEntitlement(*connection, kShellEntitlement)) return KVError::posix(EPERM, "alert shell");
     const bool isRegistered = state_.with([&](State& state) {
         if (!state.shell) state.shell = connection;
         return state.shell == connection;

@@ -38,10 +38,11 @@ std::shared_ptr<const kelvo::DeviceRoot> deviceRoot() {
     return root;
 }
 
-/// One socket thread for all recorders of the process.
+/// The socket threads of all recorders of the process. Kept for good: a handler may run on one of them, and
+/// wait for whatever it likes, while the process ends, which shall not wait for it.
 kelvo::SocketTransport& transport() {
-    static kelvo::SocketTransport shared(deviceRoot(), nullptr);
-    return shared;
+    static auto* const shared = std::make_unique<kelvo::SocketTransport>(deviceRoot(), nullptr).release();
+    return *shared;
 }
 
 std::shared_ptr<kelvo::KVUserErrors> userErrors() {
@@ -102,7 +103,6 @@ std::string socketPath(const RecorderOptions& options) {
 }
 
 RecorderEnvironment localEnvironment(const RecorderOptions& options) {
-    transport();  // made before, and so gone after, any recorder that lives as long as the process
     return {
         [path = socketPath(options)] { return transport().connectToSocket(path); },
         [timer = std::make_shared<Timer>()](auto pause, auto task) { timer->after(pause, std::move(task)); },

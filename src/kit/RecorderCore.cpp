@@ -41,14 +41,27 @@ void Recorder::Core::tell(const std::function<void(KVRemoteDaemon&)>& send) {
 }
 
 kelvo::Result<IPCConnectionRef> Recorder::Core::connection() {
+    bool isNew = false;
+    auto found = presentConnection(isNew);
+    if (!isNew) return found;
+    // Outside of the lock: an executor may run the handler in here, and that may make requests.
+    changeState([](RecorderState& state) { state.isConnected = true; });
+    (*found)->resume();
+    // The recorder may have gone before this connection was there to be ended.
+    if (isShutDown_) (*found)->invalidate();
+    return found;
+}
+
+/// A new one is not resumed yet.
+kelvo::Result<IPCConnectionRef> Recorder::Core::presentConnection(bool& isNew) {
     const std::lock_guard lock(connecting_);
     if (IPCConnectionRef present = connection_.copy()) return present;
     if (isShutDown_) return kelvo::KVError::posix(ESHUTDOWN, "recorder");
     auto made = environment_.connect();
     if (!made) return made;
-    connection_.set(*made);
-    changeState([](RecorderState& state) { state.isConnected = true; });
     setUp(*made);
+    connection_.set(*made);
+    isNew = true;
     return made;
 }
 
@@ -60,7 +73,6 @@ void Recorder::Core::setUp(const IPCConnectionRef& connection) {
     connection->setInvalidationHandler([weakSelf = weak_from_this(), weak = std::weak_ptr(connection)] {
         if (const auto self = weakSelf.lock()) self->lost(weak);
     });
-    connection->resume();
 }
 
 /// However the connection ended, it was not this side that wanted it: then nobody listens any more.

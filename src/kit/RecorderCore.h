@@ -99,6 +99,7 @@ class Recorder::Core : public kelvo::KVClientProtocol, public std::enable_shared
     void request(const std::function<void(kelvo::KVRemoteDaemon&)>& send, FailureHandler failed);
     void tell(const std::function<void(kelvo::KVRemoteDaemon&)>& send);
     kelvo::Result<kelvo::IPCConnectionRef> connection();
+    kelvo::Result<kelvo::IPCConnectionRef> presentConnection(bool& isNew);
     void setUp(const kelvo::IPCConnectionRef& connection);
     void lost(const std::weak_ptr<kelvo::IPCConnection>& connection);
     void lookAgain(std::chrono::milliseconds pause);

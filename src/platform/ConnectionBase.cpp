@@ -184,7 +184,7 @@ ConnectionBase::AwaitedReply ConnectionBase::takeAwaited(ReplyIdentifier identif
 }
 
 void ConnectionBase::send(std::size_t method, const Array& arguments, IPCReply replyHandler,
-                          const std::function<void(const KVError&)>& errorHandler) {
+                          const ErrorReport& errorHandler) {
     const OptionalError error = trySend(method, arguments, {std::move(replyHandler), errorHandler});
     if (error && errorHandler) errorHandler(*error);
 }
@@ -198,14 +198,24 @@ OptionalError ConnectionBase::trySend(std::size_t method, const Array& arguments
         do {
             identifier = ++lastIdentifier_;
         } while (identifier == 0);
-        awaitedReplies_.with([&](auto& replies) { replies.emplace(identifier, std::move(awaited)); });
+        awaitedReplies_.with([&](auto& replies) { replies.emplace(identifier, std::exchange(awaited, {})); });
     }
-    OptionalError error = isOver() ? connectionOver() : transmit(method, description, arguments, identifier);
+    OptionalError error = isOver()
+                              ? connectionOver()
+                              : transmit(method, description, arguments, identifier, awaited.errorHandler);
     if (identifier == 0) return error;
     if (!error && !isOver()) return std::nullopt;
     // The connection may have ended meanwhile and reported this reply: whoever takes it reports.
     if (!takeAwaited(identifier).handler) return std::nullopt;
     return error ? error : connectionOver();
+}
+
+void ConnectionBase::reportUnsent(std::vector<ErrorReport> reports) {
+    if (reports.empty()) return;
+    queue_.async([self = shared_from_this(), reports = std::move(reports)] {
+        for (const ErrorReport& report : reports)
+            report(connectionOver());
+    });
 }
 
 void ConnectionBase::cutOff(const std::string& reason) {

@@ -47,6 +47,7 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
   protected:
     enum class State : std::uint8_t { open, lost, over };
     using ReplyIdentifier = std::uint32_t;
+    using ErrorReport = std::function<void(const KVError&)>;
 
     explicit ConnectionBase(const char* queueLabel) : queue_(queueLabel) {}
 
@@ -65,9 +66,12 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     std::shared_ptr<const IPCInterface> remoteInterface() const { return remoteInterface_.copy(); }
 
     /// To the transport: send this. A reply is wanted under `identifier` unless it is 0. An error means that
-    /// nothing was sent.
+    /// nothing was sent. What is only queued by then, wants no reply and is still there at the connection's
+    /// end goes to `reportUnsent`.
     virtual OptionalError transmit(std::size_t method, const IPCMethod& description, const Array& arguments,
-                                   ReplyIdentifier identifier) = 0;
+                                   ReplyIdentifier identifier, const ErrorReport& whenUnsent) = 0;
+    /// Runs what messages left behind that were taken and never sent, on the connection's queue.
+    void reportUnsent(std::vector<ErrorReport> reports);
     /// Starts receiving; called once.
     virtual void didResume() {}
     /// A message was served: `waitingCost` fell.
@@ -96,7 +100,7 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     };
     struct AwaitedReply {
         IPCReply handler;
-        std::function<void(const KVError&)> errorHandler;
+        ErrorReport errorHandler;
     };
     struct Gate {
         bool isOpen = false;
@@ -105,7 +109,7 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     };
 
     void send(std::size_t method, const Array& arguments, IPCReply replyHandler,
-              const std::function<void(const KVError&)>& errorHandler);
+              const ErrorReport& errorHandler);
     OptionalError trySend(std::size_t method, const Array& arguments, AwaitedReply awaited);
     AwaitedReply takeAwaited(ReplyIdentifier identifier);
     IPCReply owed(IPCReply reply) const;

@@ -74,14 +74,24 @@ class IPCConnection {
     /// Ends the connection; what was sent before still goes out as far as the peer takes it at once.
     virtual void invalidate() = 0;
 
-    /// The peer. `errorHandler` (may be empty) runs for each message that cannot be delivered and for each
-    /// reply that can no longer come: at once on the sender's thread when the connection is over, else on the
-    /// connection's queue. Its error has the domain `kPOSIXErrorDomain`.
+    /// The peer. `errorHandler` (may be empty) runs once for each message that was not handed to the system
+    /// as a whole before the connection's end, and for each reply that can no longer come: at once on the
+    /// sender's thread when that is known by then, else on the connection's queue. What the system took may
+    /// still be lost with a peer that does not read it; nothing tells. The error has the domain
+    /// `kPOSIXErrorDomain`.
     virtual std::shared_ptr<IPCRemoteObject> remoteObjectProxyWithErrorHandler(
         std::function<void(const KVError&)> errorHandler) = 0;
 };
 
 using IPCConnectionRef = std::shared_ptr<IPCConnection>;
+
+/// Whether the peer holds a right that is granted or not. Only a boolean grants it; a right of that name with
+/// a number or a text was meant for something else.
+inline bool holdsEntitlement(const IPCConnection& connection, std::string_view name) {
+    const Value value = connection.valueForEntitlement(name);
+    const bool* isGranted = value.as<bool>();
+    return isGranted != nullptr && *isGranted;
+}
 
 inline std::optional<URL> urlForPeer(const IPCConnection& connection, const std::optional<URL>& url) {
     return url ? std::optional(connection.urlForPeer(*url)) : std::nullopt;

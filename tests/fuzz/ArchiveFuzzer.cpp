@@ -1,16 +1,20 @@
 #include "ipc/CBOR.h"
 #include "ipc/KVBroadcastConfigurationCoding.h"
+#include "ipc/KVIOSurfaceObjectCoding.h"
 
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
 #include <span>
 
-/// Any bytes are a record or an error, and a value that was read reads the same once it is written again.
+/// Any bytes are a record or an error, none of them brings a surface, and a value that was read reads the
+/// same once it is written again.
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     using namespace kelvo;
     const auto bytes = std::as_bytes(std::span(data, size));
     static_cast<void>(unarchived<KVBroadcastConfigurationCoding>(bytes));
+    const auto surface = unarchived<KVIOSurfaceObjectCoding>(bytes);
+    if (surface && surface->ioSurface()) std::abort();
     constexpr cbor::Bounds kBounds{kDeepestArchive, kMostArchivedItems};
     const auto value = cbor::decode(bytes, kBounds);
     if (!value) return 0;

@@ -98,6 +98,7 @@ class FakeDaemon : public KVConnectionManagerDelegate {
         const IPCConnectionRef& connection, const std::optional<std::string>& bundleIdentifier) override {
         arrivals.with(
             [&](auto& all) { all.emplace_back(bundleIdentifier, connection->processIdentifier()); });
+        if (const auto runs = onArrival.copy()) runs();
     }
     void applicationDisconnectedWithBundleID(const std::optional<std::string>& bundleIdentifier,
                                              std::int32_t processIdentifier) override {
@@ -114,8 +115,9 @@ class FakeDaemon : public KVConnectionManagerDelegate {
     /// When set, the handler of a stop is kept instead of called.
     std::atomic<bool> keepsStopHandler{false};
     Guarded<MovieHandler> keptStopHandler;
-    /// When set, runs inside each request.
-    std::function<void(const std::string& request)> onRequest;
+    /// When set, run inside each request, and while this daemon is told of a client's arrival.
+    Guarded<std::function<void(const std::string& request)>> onRequest;
+    Guarded<std::function<void()>> onArrival;
 
     inline static const KVError kError{"domain", -5, {{"key", "text"}}};
 
@@ -123,7 +125,7 @@ class FakeDaemon : public KVConnectionManagerDelegate {
     void note(const std::string& request, Array values = {}) {
         requests_.with([&](auto& all) { all.push_back(request); });
         arguments_.with([&](auto& all) { all.push_back(std::move(values)); });
-        if (onRequest) onRequest(request);
+        if (const auto runs = onRequest.copy()) runs(request);
     }
 
     Guarded<std::vector<std::string>> requests_;

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <iterator>
 
 namespace kelvo {
 namespace {
@@ -26,7 +27,7 @@ std::uint64_t SimulatedConnection::drain() {
 }
 
 OptionalError SimulatedConnection::transmit(std::size_t method, const IPCMethod&, const Array& arguments,
-                                            ReplyIdentifier identifier) {
+                                            ReplyIdentifier identifier, const ErrorReport&) {
     const auto receiver = peer();
     if (!receiver || receiver->isOver()) return KVError::posix(ENOTCONN, "connection");
     receiver->deliver(method, arguments, identifier);
@@ -112,7 +113,7 @@ IPCConnectionRef SimulatedIPC::currentConnection() {
 }
 
 std::uint64_t SimulatedIPC::drainAll() {
-    std::uint64_t activity = 0;
+    std::uint64_t activity = activityOfThoseGone_;
     for (const SimulatedConnectionRef& connection : connections_.copy())
         activity += connection->drain();
     return activity;
@@ -122,7 +123,21 @@ bool SimulatedIPC::settle() {
     const std::uint64_t before = settledActivity_;
     for (std::uint64_t activity = drainAll(); activity != settledActivity_; activity = drainAll())
         settledActivity_ = activity;
+    letGoOfWhatIsOver();
     return settledActivity_ != before;
+}
+
+/// Those that somebody else holds may have something to do yet, which is to be waited for.
+void SimulatedIPC::letGoOfWhatIsOver() {
+    std::vector<SimulatedConnectionRef> gone;  // destroyed after the lock is free
+    connections_.with([&](auto& all) {
+        const auto isNeeded = [](const auto& each) { return !each->isOver() || each.use_count() > 1; };
+        const auto firstGone = std::stable_partition(all.begin(), all.end(), isNeeded);
+        gone.assign(std::make_move_iterator(firstGone), std::make_move_iterator(all.end()));
+        all.erase(firstGone, all.end());
+    });
+    for (const SimulatedConnectionRef& connection : gone)
+        activityOfThoseGone_ += connection->drain();
 }
 
 }  // namespace kelvo

@@ -45,7 +45,7 @@ class SimulatedConnection : public ConnectionBase {
 
   protected:
     OptionalError transmit(std::size_t method, const IPCMethod& description, const Array& arguments,
-                           ReplyIdentifier identifier) override;
+                           ReplyIdentifier identifier, const ErrorReport& whenUnsent) override;
     void close() override;
 
   private:
@@ -124,12 +124,14 @@ class SimulatedIPC : public IPCTransport {
     std::shared_ptr<SimulatedListener> listenerNamed(std::string_view serviceName) const;
     Result<IPCConnectionRef> connectTo(const std::shared_ptr<SimulatedListener>& listener);
     std::uint64_t drainAll();
+    void letGoOfWhatIsOver();
 
     Guarded<Identity> identity_;
     Guarded<IPCConnectionRef> current_;
     Guarded<std::vector<std::weak_ptr<SimulatedListener>>> listeners_;
-    // Held for good, as a transport holds its connections until they end; a test's transport goes soon.
+    // Held until they have ended and nothing runs for them any more.
     Guarded<std::vector<SimulatedConnectionRef>> connections_;
+    std::atomic<std::uint64_t> activityOfThoseGone_{0};
     std::atomic<std::uint64_t> settledActivity_{0};
 };
 

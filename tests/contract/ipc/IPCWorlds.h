@@ -12,6 +12,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <unistd.h>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -61,6 +62,11 @@ class SimulatedIPCWorld : public IPCWorldBase {
         device_.ipc->setIdentity(processIdentifier, program.entitlements);
         return {processIdentifier, *device_.ipc->connectToService(service)};
     }
+    /// A connection of this process itself, which may have several.
+    ConnectedProcess connectFromHere(const std::string& service) {
+        device_.ipc->setIdentity(::getpid(), {});
+        return {::getpid(), *device_.ipc->connectToService(service)};
+    }
 
     /// Lets everything run, and says whether it came to that.
     bool comesTrue(const std::function<bool()>& condition) {
@@ -86,6 +92,9 @@ class SocketIPCWorld : public IPCWorldBase {
         return {process.processIdentifier(),
                 std::make_shared<SocketConnection>(SocketConnection::Side::client, process.take(),
                                                    clientLoop_, nullptr, nullptr, nullptr)};
+    }
+    ConnectedProcess connectFromHere(const std::string& service) {
+        return {::getpid(), *transport_->connectToService(service)};
     }
 
     bool comesTrue(const std::function<bool()>& condition) { return eventually(condition); }

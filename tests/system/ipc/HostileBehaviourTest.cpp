@@ -116,10 +116,10 @@ TEST_F(HostileBehaviourTest, WhoeverAsksAndNeverReadsIsCutOff) {
 TEST_F(HostileBehaviourTest, TooManyOutstandingRequestsEndTheConnection) {
     daemon->keepsStopHandler = true;
     Guarded<std::vector<MovieHandler>> kept;
-    daemon->onRequest = [&](const std::string& request) {
+    daemon->onRequest.set([&](const std::string& request) {
         if (request == "stopRecordingWithHandler")
             kept.with([&](auto& all) { all.push_back(daemon->keptStopHandler.copy()); });
-    };
+    });
     const Client client = connect();
     const Client bystander = connect();
     for (std::size_t i = 0; i < ipc_bounds::kMostOwedReplies + 2; ++i)

@@ -104,6 +104,43 @@ TEST(SerialQueueTurnTest, SoonStaysBehindWhatWaitsAlready) {
     EXPECT_EQ(order, (std::vector<int>{1, 2}));
 }
 
+TEST(SerialQueueTurnTest, QueueMayGoOnTheThreadThatIsToRunItsTask) {
+    auto queue = std::make_unique<SerialQueue>("test.turn");
+    queue->async([] {});
+    queue->sync([] {});  // its own thread has started, and would be waited for
+    std::vector<int> order;
+    std::promise<void> last;
+    {
+        const SpareTime spare;
+        queue->asyncOrSoon([&] { order.push_back(1); });
+        queue->async([&] {
+            order.push_back(2);
+            last.set_value();
+        });
+        queue.reset();
+        EXPECT_TRUE(order.empty());
+    }
+    last.get_future().wait();
+    EXPECT_EQ(order, (std::vector<int>{1, 2}));
+}
+
+TEST(SerialQueueTurnTest, QueueThatGoesElsewhereWaitsForTheTaskThatIsToRun) {
+    auto queue = std::make_unique<SerialQueue>("test.turn");
+    queue->async([] {});
+    queue->sync([] {});
+    bool hasRun = false;
+    std::thread other;
+    {
+        const SpareTime spare;
+        queue->asyncOrSoon([&] { hasRun = true; });
+        other = std::thread([&] {
+            queue.reset();
+            EXPECT_TRUE(hasRun);
+        });
+    }
+    other.join();
+}
+
 TEST(SerialQueueTurnTest, SpentTimeHasNoSpareTimeOfItsOwn) {
     bool wasThere = true;
     {

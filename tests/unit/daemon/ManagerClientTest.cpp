@@ -34,8 +34,10 @@ TEST_F(ManagerClientTest, AbsentEntitlementCountsAsNo) {
 }
 
 TEST_F(ManagerClientTest, EntitlementThatIsNoBooleanCountsAsNo) {
-    serve(10, {{"com.quillon.private.kelvo-kit", "yes"}});
-    EXPECT_FALSE(manager->clientHasSystemEntitlements());
+    for (const Value& value : {Value("yes"), Value("true"), Value(1), Value(0.5), Value(Array{true})}) {
+        serve(10, {{"com.quillon.private.kelvo-kit", value}});
+        EXPECT_FALSE(manager->clientHasSystemEntitlements()) << value.description();
+    }
 }
 
 TEST_F(ManagerClientTest, WithoutARequestNobodyIsEntitled) {

@@ -69,7 +69,9 @@ TEST(BroadcastConfigurationArchive, EmptyPropertiesAreLeftOut) {
 
 TEST(BroadcastConfigurationArchive, MissingOrWronglyTypedEntriesReadAsAbsent) {
     for (const Dictionary& entries :
-         {Dictionary(), Dictionary{{"clipDuration", "5"}, {"videoCompressionProperties", Array{1}}}}) {
+         {Dictionary(), Dictionary{{"clipDuration", "5"}, {"videoCompressionProperties", Array{1}}},
+          Dictionary{{"clipDuration", true}, {"videoCompressionProperties", true}},
+          Dictionary{{"clipDuration", Array{5.0}}}, Dictionary{{"clipDuration", Value()}}}) {
         const auto decoded = unarchived<Configuration>(archiveRecord(Configuration::kClassName, entries));
         ASSERT_TRUE(decoded);
         EXPECT_EQ(decoded->clipDuration(), 0.0);
@@ -82,6 +84,19 @@ TEST(BroadcastConfigurationArchive, WholeNumberIsAClipDuration) {
         unarchived<Configuration>(archiveRecord(Configuration::kClassName, {{"clipDuration", 5}}));
     ASSERT_TRUE(decoded);
     EXPECT_EQ(decoded->clipDuration(), 5.0);
+}
+
+TEST(BroadcastConfigurationArchive, ClipDurationThatIsNotFiniteIsANumberAllTheSame) {
+    const auto durationOf = [](double archived) {
+        KVBroadcastConfiguration configuration;
+        configuration.setClipDuration(archived);
+        const auto decoded = unarchived<Configuration>(archivedData<Configuration>(configuration));
+        return decoded ? decoded->clipDuration() : 0;
+    };
+    constexpr double kInfinity = std::numeric_limits<double>::infinity();
+    EXPECT_TRUE(std::isnan(durationOf(std::numeric_limits<double>::quiet_NaN())));
+    EXPECT_EQ(durationOf(kInfinity), kInfinity);
+    EXPECT_EQ(durationOf(-kInfinity), -kInfinity);
 }
 
 TEST(BroadcastConfigurationArchive, OtherClassIsRefused) {
@@ -119,6 +134,35 @@ TEST_F(SurfaceObjectCodingTest, OrdinaryArchiveHasNoSurfaceKeyAndReadsBackWithou
     const auto decoded = unarchived<KVIOSurfaceObjectCoding>(archive);
     ASSERT_TRUE(decoded);
     EXPECT_EQ(decoded->ioSurface(), nullptr);
+}
+
+TEST_F(SurfaceObjectCodingTest, SurfaceInAnArchiveThatIsNoMessageIsNotTaken) {
+    const Dictionary entries{{"ioSurface", std::shared_ptr<ObjectHandle>(surface)}};
+    const auto surfaceBy = [&](KVCoder::Kind kind) {
+        return KVIOSurfaceObjectCoding::initWithCoder(KVCoder(kind, entries)).ioSurface();
+    };
+    EXPECT_EQ(surfaceBy(KVCoder::Kind::archive), nullptr);
+    EXPECT_EQ(surfaceBy(KVCoder::Kind::ipc), surface);
+}
+
+TEST_F(SurfaceObjectCodingTest, AnotherSurfaceTakesThePlaceOfTheOneHeldWhichIsReleased) {
+    const VideoSurfaceRef other = *VideoSurface::create(VideoSurface::Geometry::packed(2, 2));
+    KVIOSurfaceObject object;
+    object.setIOSurface(surface);
+    object.setIOSurface(other);
+    EXPECT_EQ(object.ioSurface(), other);
+    EXPECT_EQ(surface.use_count(), 1);
+    EXPECT_EQ(other.use_count(), 2);
+}
+
+TEST_F(SurfaceObjectCodingTest, SettingNothingReleasesTheSurfaceHeld) {
+    KVIOSurfaceObject object;
+    object.setIOSurface(surface);
+    object.setIOSurface(nullptr);
+    EXPECT_EQ(object.ioSurface(), nullptr);
+    EXPECT_EQ(surface.use_count(), 1);
+    object.setIOSurface(nullptr);
+    EXPECT_EQ(object.ioSurface(), nullptr);
 }
 
 TEST_F(SurfaceObjectCodingTest, ObjectWithoutASurfaceWritesNothing) {

@@ -1,81 +1,18 @@
 #include "ConnectionManagerFixture.h"
 #include "ipc/KVClientProxy.h"
 #include "ipc/KVClientProxyFactory.h"
+#include "support/ClientCallbacks.h"
+
+#include <array>
+#include <string>
 
 namespace kelvo {
 namespace {
 
+using test::ClientCallback;
+using test::kCallbackError;
 using testing::ElementsAre;
 using testing::IsEmpty;
-
-const KVError kError{"domain", -5809, {{"key", 1}}};
-
-/// One callback, and what proxies log about it.
-struct Callback {
-    std::string name;
-    void (*send)(KVClientProtocol&);
-    std::string text;
-    std::string failureText;    // empty: nothing is sent
-    std::string fanOutText;     // empty: nothing is logged by the multiple proxy
-    std::string fanOutFailure;  // empty: nothing is sent by the multiple proxy
-
-    friend void PrintTo(const Callback& callback, std::ostream* out) { *out << callback.name; }
-};
-
-std::vector<Callback> callbacks() {
-    const std::string tail = ": error getting remote proxy: 107";
-    const std::string saved = ":recodingDidStopAndSavedToCameraRoll: video saved to camera roll: 107";
-    const auto row = [&](const std::string& name, void (*send)(KVClientProtocol&), const std::string& text,
-                         bool isFannedOut) {
-        const std::string failure = name == "recordingLockInterrupted" ? saved : ":" + name + tail;
-        return Callback{name,
-                        send,
-                        "KVClientProxy:" + text,
-                        "KVClientProxy" + failure,
-                        isFannedOut ? "KVMultipleClientProxy:" + text : "",
-                        isFannedOut ? "KVMultipleClientProxy" + failure : ""};
-    };
-    return {
-        row(
-            "recordingDidStopWithError",
-            [](KVClientProtocol& c) { c.recordingDidStopWithError(kError, URL("file:///m")); },
-            "recordingDidStopWithError:movieURL:", true),
-        row(
-            "updateBroadcastServiceInfo",
-            [](KVClientProtocol& c) {
-                c.updateBroadcastServiceInfo({{"a", "b"}});
-            },
-            "updateBroadcastServiceInfo:", false),
-        row(
-            "updateBroadcastURL", [](KVClientProtocol& c) { c.updateBroadcastURL(URL("rtmp://x")); },
-            "updateBroadcastURL:", true),
-        row(
-            "captureHandlerWithSample",
-            [](KVClientProtocol& c) {
-                c.captureHandlerWithSample(std::make_shared<KVIOSurfaceObject>(), {});
-            },
-            "captureHandlerWithSample:", false),
-        row(
-            "captureHandlerWithAudioSample",
-            [](KVClientProtocol& c) {
-                const Bytes sound(8);
-                c.captureHandlerWithAudioSample(sound, {}, 2, SampleBuffer::Type::microphone, {});
-            },
-            "captureHandlerWithAudioSample:", false),
-        row(
-            "recordingLockInterrupted", [](KVClientProtocol& c) { c.recordingLockInterrupted(kError); },
-            "recordingLockInterrupted:", true),
-        row(
-            "recordingShouldResume", [](KVClientProtocol& c) { c.recordingShouldResume(); },
-            "recordingShouldResume:", false),
-        row(
-            "recordingDidPause", [](KVClientProtocol& c) { c.recordingDidPause(); },
-            "recordingDidPause:", false),
-        row(
-            "recordingTimerDidUpdate", [](KVClientProtocol& c) { c.recordingTimerDidUpdate("00:01"); },
-            "recordingTimerDidUpdate:", true),
-    };
-}
 
 /// The daemon keeps the ends of its clients' connections here.
 class ProxyFixture : public test::ConnectionManagerFixture, public IPCListenerDelegate {
@@ -99,7 +36,7 @@ class ProxyFixture : public test::ConnectionManagerFixture, public IPCListenerDe
     std::atomic<int> invalidations{0};
 };
 
-class CallbackTest : public ProxyFixture, public testing::WithParamInterface<Callback> {};
+class CallbackTest : public ProxyFixture, public testing::WithParamInterface<ClientCallback> {};
 
 TEST_P(CallbackTest, SingleProxyLogsAndSends) {
     const Client client = connect(10);
@@ -126,7 +63,7 @@ TEST_P(CallbackTest, MultipleProxySendsToEveryoneOrDrops) {
     KVMultipleClientProxy proxy;
     proxy.handleNewConnection(accepted[0]);
     proxy.handleNewConnection(accepted[1]);
-    if (GetParam().name == "recordingShouldResume" || GetParam().name == "recordingDidPause") return;
+    if (!GetParam().isOfferedToEveryone) return;
     GetParam().send(proxy);
     device.settle();
     if (GetParam().fanOutText.empty()) {
@@ -150,10 +87,10 @@ TEST_P(CallbackTest, MultipleProxyLogsAFailedDelivery) {
     EXPECT_EQ(log.count(LogLevel::error, GetParam().fanOutFailure), 1U);
 }
 
-std::string callbackName(const testing::TestParamInfo<Callback>& info) {
+std::string callbackName(const testing::TestParamInfo<ClientCallback>& info) {
     return info.param.name;
 }
-INSTANTIATE_TEST_SUITE_P(All, CallbackTest, testing::ValuesIn(callbacks()), callbackName);
+INSTANTIATE_TEST_SUITE_P(All, CallbackTest, testing::ValuesIn(test::clientCallbacks()), callbackName);
 
 class KVClientProxyTest : public ProxyFixture {};
 
@@ -169,7 +106,7 @@ TEST_F(KVClientProxyTest, StateUpdateOnlyLogs) {
 TEST_F(KVClientProxyTest, EveryArgumentArrivesAsItWasSent) {
     const Client client = connect(10);
     KVClientProxy proxy(accepted.front());
-    proxy.recordingDidStopWithError(kError, std::nullopt);
+    proxy.recordingDidStopWithError(kCallbackError, std::nullopt);
     proxy.recordingDidStopWithError(std::nullopt, URL("file:///m"));
     proxy.updateBroadcastServiceInfo({{"a", Array{1, "x"}}});
     const auto surface = std::make_shared<KVIOSurfaceObject>();
@@ -183,7 +120,7 @@ TEST_F(KVClientProxyTest, EveryArgumentArrivesAsItWasSent) {
     device.settle();
     using Stop = test::FakeClientProxy::Stop;
     EXPECT_THAT(client.callbacks->stops.copy(),
-                ElementsAre(Stop{kError, std::nullopt}, Stop{std::nullopt, URL("file:///m")}));
+                ElementsAre(Stop{kCallbackError, std::nullopt}, Stop{std::nullopt, URL("file:///m")}));
     EXPECT_THAT(client.callbacks->serviceInfos.copy(), ElementsAre(Dictionary{{"a", Array{1, "x"}}}));
     const auto frame = client.callbacks->videoSamples.copy().at(0);
     ASSERT_NE(frame.surface->ioSurface(), nullptr);
@@ -305,6 +242,9 @@ TEST_F(KVClientProxyFactoryTest, PrivilegedClientsShareOneProxy) {
 TEST_F(KVClientProxyFactoryTest, OtherClientsGetAProxyOfTheirOwn) {
     connect(10, {{"com.quillon.private.kelvo-kit", false}});
     connect(11);
+    for (const Value& value : {Value(1), Value(0.5), Value("true")})
+        connect(12, {{"com.quillon.private.kelvo-kit", value}});
+    ASSERT_EQ(accepted.size(), 5U);
     for (const IPCConnectionRef& connection : accepted) {
         const auto proxy = KVClientProxyFactory::clientProxyWithNewConnection(connection);
         const auto single = std::dynamic_pointer_cast<KVClientProxy>(proxy);
@@ -316,12 +256,43 @@ TEST_F(KVClientProxyFactoryTest, OtherClientsGetAProxyOfTheirOwn) {
 TEST_F(KVClientProxyTest, MovieIsGivenWhereTheClientFindsIt) {
     const Client client = connect(10);
     std::static_pointer_cast<SimulatedConnection>(accepted.front())->peerSuffix = "?peer";
-    KVClientProxy(accepted.front()).recordingDidStopWithError(std::nullopt, URL("file:///m"));
-    KVMultipleClientProxy all;
-    all.handleNewConnection(accepted.front());
+    KVClientProxy proxy(accepted.front());
+    proxy.recordingDidStopWithError(std::nullopt, URL("file:///m"));
     device.settle();
     ASSERT_EQ(client.callbacks->stops.copy().size(), 1U);
     EXPECT_EQ(client.callbacks->stops.copy().front().movieURL, URL("file:///m?peer"));
+}
+
+TEST_F(KVMultipleClientProxyTest, MovieIsGivenWhereEachClientFindsIt) {
+    const std::array clients{connect(10), connect(11)};
+    const std::array<std::string, 2> suffixes{"?one", "?other"};
+    for (std::size_t i = 0; i < 2; ++i) {
+        std::static_pointer_cast<SimulatedConnection>(accepted[i])->peerSuffix = suffixes[i];
+        proxy.handleNewConnection(accepted[i]);
+    }
+    proxy.recordingDidStopWithError(std::nullopt, URL("file:///m"));
+    proxy.recordingDidStopWithError(kCallbackError, std::nullopt);
+    device.settle();
+    using Stop = test::FakeClientProxy::Stop;
+    for (std::size_t i = 0; i < 2; ++i) {
+        EXPECT_THAT(clients[i].callbacks->stops.copy(),
+                    ElementsAre(Stop{std::nullopt, URL("file:///m" + suffixes[i])},
+                                Stop{kCallbackError, std::nullopt}));
+    }
+}
+
+/// No peer has that number; the simulated device can give it all the same.
+TEST_F(KVMultipleClientProxyTest, ResetOfProcessZeroTakesNothingOutOfTheSet) {
+    const Client nobody = connect(0);
+    const Client stays = connect(10);
+    proxy.handleNewConnection(accepted[0]);
+    proxy.handleNewConnection(accepted[1]);
+    proxy.resetConnectionWithProcessIdentifier(0);
+    EXPECT_THAT(proxy.connectionSet(), ElementsAre(accepted[0], accepted[1]));
+    proxy.recordingTimerDidUpdate("00:01");
+    device.settle();
+    EXPECT_THAT(nobody.callbacks->messages(), IsEmpty());
+    EXPECT_THAT(stays.callbacks->timerTexts.copy(), ElementsAre("00:01"));
 }
 
 }  // namespace

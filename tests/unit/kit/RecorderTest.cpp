@@ -71,7 +71,9 @@ class RecorderTest : public testing::Test {
     kelvo::Result<kelvo::IPCConnectionRef> connect() {
         ++attempts;
         if (!isDaemonUp) return kelvo::KVError::posix(ECONNREFUSED, "/run/socket");
-        return device.ipc->connectToService("com.quillon.kelvod");
+        auto connection = device.ipc->connectToService("com.quillon.kelvod");
+        if (afterConnecting) afterConnecting();
+        return connection;
     }
 
     /// Everything that follows from what was done has happened, on the executor too.
@@ -143,6 +145,7 @@ class RecorderTest : public testing::Test {
     std::shared_ptr<kelvo::IPCListener> listener;
     bool isDaemonUp = false;
     int attempts = 0;
+    std::function<void()> afterConnecting;
     Guarded<std::deque<Task>> tasks;
     Guarded<std::deque<std::pair<std::chrono::milliseconds, Task>>> timers;
     std::vector<RecorderState> states;
@@ -436,9 +439,9 @@ TEST_F(RecorderTest, RequestUnderWayFailsWhenTheDaemonIsLost) {
     startRecording();
     const auto connection = daemon->client.copy();
     // The fake daemon never answers this one.
-    daemon->onRequest = [&](const std::string& request) {
+    daemon->onRequest.set([&](const std::string& request) {
         if (request == "saveVideoToCameraRoll") connection->invalidate();
-    };
+    });
     recorder->save("/m.mp4", noteDone());
     settle();
     EXPECT_THAT(answers, ElementsAre("-5815"));
@@ -503,6 +506,28 @@ TEST_F(RecorderTest, GoneRecorderLooksForNoDaemon) {
     const int before = attempts;
     fireTimer();
     EXPECT_EQ(attempts, before);
+}
+
+TEST_F(RecorderTest, RecorderThatGoesWhileItIsLookedForLeavesNoConnection) {
+    startRecording();
+    killDaemon();
+    startDaemon();
+    const std::size_t before = daemon->departures.copy().size();
+    afterConnecting = [this] { recorder.reset(); };
+    fireTimer();
+    EXPECT_EQ(daemon->departures.copy().size(), before + 2);
+}
+
+TEST_F(RecorderTest, HandlerThatRunsAtOnceMayMakeRequests) {
+    const auto direct =
+        RecorderTestAccess::make({[this] { return connect(); }, [](auto, auto) {}, [](auto task) { task(); },
+                                  std::make_shared<kelvo::KVUserErrors>(localization)});
+    direct->onState([&](const RecorderState& state) {
+        if (state.isConnected) direct->pause();
+    });
+    direct->discard();
+    settle();
+    EXPECT_THAT(daemon->requests(), ElementsAre("pauseRecording", "discardRecordingWithHandler"));
 }
 
 TEST_F(RecorderTest, RequestsWithoutAHandlerAreAllowed) {

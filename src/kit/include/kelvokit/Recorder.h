@@ -73,8 +73,12 @@ struct BroadcastOptions {
 /// of a second and at last every five, and every request looks at once. A recording does not survive the
 /// daemon that made it.
 ///
+/// Without an executor of the program's, handlers run one at a time on threads of the library. One may take
+/// its time and destroy the recorder, but not wait for another handler of the same recorder, which has its
+/// turn only then.
+///
 /// Once the destructor returns no handler runs, but for one from which it was called. It waits for a handler
-/// that runs on another thread.
+/// that runs on another thread; the end of the process does not.
 class KELVOKIT_EXPORT Recorder {
   public:
     using StartHandler = std::function<void(const std::optional<Error>& error, bool microphone, bool camera)>;

@@ -1,5 +1,6 @@
 #include "platform/linux/ipc/Peer.h"
 
+#include <cerrno>
 #include <poll.h>
 #include <sys/socket.h>
 #include <sys/syscall.h>
@@ -7,26 +8,25 @@
 namespace kelvo {
 namespace {
 
-/// The socket option of Linux 6.5 that gives the peer itself; older headers do not name it.
-constexpr int kPeerProcessOption = 77;
-
-UniqueFd openProcess(int socket, std::int32_t processIdentifier) {
+UniqueFd openProcess(int socket, std::int32_t processIdentifier, int option) {
     int descriptor = -1;
     socklen_t size = sizeof(descriptor);
-    if (::getsockopt(socket, SOL_SOCKET, kPeerProcessOption, &descriptor, &size) == 0)
-        return UniqueFd(descriptor);
+    if (::getsockopt(socket, SOL_SOCKET, option, &descriptor, &size) == 0) return UniqueFd(descriptor);
+    // A process that has ended already has no descriptor either, and its number may be somebody else's.
+    if (errno != ENOPROTOOPT) return {};
     return UniqueFd(static_cast<int>(::syscall(SYS_pidfd_open, processIdentifier, 0)));
 }
 
 }  // namespace
 
-Peer::Peer(int socket, std::shared_ptr<BundleService> bundles) : bundles_(std::move(bundles)) {
+Peer::Peer(int socket, std::shared_ptr<BundleService> bundles, int processOption)
+    : bundles_(std::move(bundles)) {
     ucred credentials{};
     socklen_t size = sizeof(credentials);
     if (::getsockopt(socket, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0) return;
     processIdentifier_ = credentials.pid;
     user_ = credentials.uid;
-    process_.set(std::make_shared<const UniqueFd>(openProcess(socket, processIdentifier_)));
+    process_.set(std::make_shared<const UniqueFd>(openProcess(socket, processIdentifier_, processOption)));
 }
 
 /// A process that has ended makes its descriptor readable.

@@ -14,8 +14,12 @@ namespace kelvo {
 /// The process at the other end of a socket, as the kernel saw it when the socket was connected. Thread-safe.
 class Peer {
   public:
-    /// Reads the identity now. `bundles` may be none: then the peer holds no rights.
-    Peer(int socket, std::shared_ptr<BundleService> bundles);
+    /// The socket option of Linux 6.5 that gives the peer itself; older headers do not name it.
+    static constexpr int kProcessOption = 77;
+
+    /// Reads the identity now. `bundles` may be none: then the peer holds no rights. Where the system does
+    /// not know `processOption`, the process is looked up by its number.
+    Peer(int socket, std::shared_ptr<BundleService> bundles, int processOption = kProcessOption);
 
     std::int32_t processIdentifier() const { return processIdentifier_; }
     uid_t user() const { return user_; }

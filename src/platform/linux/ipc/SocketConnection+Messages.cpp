@@ -33,6 +33,13 @@ bool allowsObjects(const std::vector<IPCArgument>& arguments) {
         arguments, [](const IPCArgument& argument) { return argument.allowedObjects != IPCObjects::none; });
 }
 
+/// As `writeBody`; what the peer would not take is not sent either, or it would cut this side off.
+OptionalError writeWithinBounds(const Array& values, dbus::Message& message) {
+    if (OptionalError error = dbus::writeBody(values, message)) return error;
+    if (message.body.size() <= ipc_bounds::kLargestMessage - ipc_bounds::kLargestHeader) return std::nullopt;
+    return KVError::posix(EMSGSIZE, "arguments of " + message.member);
+}
+
 }  // namespace
 
 void SocketConnection::handle(dbus::Message message) {
@@ -95,7 +102,7 @@ IPCReply SocketConnection::replyTo(std::uint32_t serial, const IPCMethod& method
         dbus::Message reply = dbus::Message::replying(dbus::MessageType::reply, serial);
         reply.member = name;
         reply.signature = signature;
-        if (const OptionalError error = dbus::writeBody(values, reply)) {
+        if (const OptionalError error = writeWithinBounds(values, reply)) {
             KVLogError("IPC: reply of %s cannot be sent", name.c_str());
             reply = dbus::Message::replying(dbus::MessageType::error, serial);
             reply.errorName = "org.freedesktop.DBus.Error.Failed";
@@ -159,7 +166,8 @@ void SocketConnection::handleReply(dbus::Message message) {
 }
 
 OptionalError SocketConnection::transmit(std::size_t method, const IPCMethod& description,
-                                         const Array& arguments, ReplyIdentifier identifier) {
+                                         const Array& arguments, ReplyIdentifier identifier,
+                                         const ErrorReport& whenUnsent) {
     const auto interface = remoteInterface();
     LentSurfaces lent =
         description.isOneWay() ? surfacesIn(description.arguments, arguments) : LentSurfaces();
@@ -169,25 +177,28 @@ OptionalError SocketConnection::transmit(std::size_t method, const IPCMethod& de
     call.interface = interface->name;
     call.member = description.name;
     call.signature = signatureOf(description.arguments);
-    if (OptionalError error = dbus::writeBody(arguments, call)) return error;
-    return sendCall(std::move(call), identifier, method, std::move(lent));
+    if (OptionalError error = writeWithinBounds(arguments, call)) return error;
+    return sendCall(std::move(call), identifier, method, std::move(lent), whenUnsent);
 }
 
 OptionalError SocketConnection::sendCall(dbus::Message message, ReplyIdentifier identifier,
-                                         std::size_t method, LentSurfaces surfaces) {
+                                         std::size_t method, LentSurfaces surfaces, ErrorReport whenUnsent) {
+    const KVError notConnected = KVError::posix(ENOTCONN, "connection");
     std::unique_lock lock(outMutex_);
+    // Looked at under the lock: what is queued or lent afterwards would not be found by `close`.
+    if (isOver() || cannotSend_) return notConnected;
     message.serial = nextSerial();
     if (!surfaces.empty()) {
-        // Looked at under the lock: what is lent afterwards would not be found by `close`.
-        if (isOver()) return KVError::posix(ENOTCONN, "connection");
         if (out_.lent.size() >= ipc_bounds::kMostLentMessages) return KVError::posix(EAGAIN, "surface");
         out_.lent.emplace(message.serial, std::move(surfaces));
     }
     if (identifier != 0) out_.awaited[message.serial] = {identifier, method};
-    const bool isWithinBounds = push(std::move(message));
+    const bool isWithinBounds = push(std::move(message), identifier == 0 ? std::move(whenUnsent) : nullptr);
     lock.unlock();
     afterPush(isWithinBounds);
-    return isOver() || cannotSend_ ? OptionalError(KVError::posix(ENOTCONN, "connection")) : std::nullopt;
+    // What was queued without wanting a reply is reported from the queue, should it stay there.
+    const bool isReportedHere = identifier != 0 ? isOver() || cannotSend_ : !isWithinBounds;
+    return isReportedHere ? OptionalError(notConnected) : std::nullopt;
 }
 
 void SocketConnection::sendMessage(dbus::Message message) {
@@ -205,13 +216,11 @@ std::uint32_t SocketConnection::nextSerial() {
 }
 
 /// Queues a message. False when that passes a bound; then nothing was queued.
-bool SocketConnection::push(dbus::Message message) {
-    Bytes bytes = dbus::serialize(message);  // first: it counts the descriptors
-    return pushBytes(std::move(bytes), std::move(message.descriptors));
+bool SocketConnection::push(dbus::Message message, ErrorReport whenUnsent) {
+    return push({dbus::serialize(message), 0, std::move(message.descriptors), std::move(whenUnsent)});
 }
 
-bool SocketConnection::pushBytes(Bytes bytes, std::vector<UniqueFd> descriptors) {
-    Outgoing outgoing{std::move(bytes), 0, std::move(descriptors)};
+bool SocketConnection::push(Outgoing outgoing) {
     if (out_.unsentBytes + outgoing.bytes.size() > ipc_bounds::kMostUnsentBytes ||
         out_.unsentDescriptors + outgoing.descriptors.size() > ipc_bounds::kMostUnsentDescriptors)
         return false;
@@ -219,6 +228,14 @@ bool SocketConnection::pushBytes(Bytes bytes, std::vector<UniqueFd> descriptors)
     out_.unsentDescriptors += outgoing.descriptors.size();
     out_.queue.push_back(std::move(outgoing));
     return true;
+}
+
+std::vector<SocketConnection::ErrorReport> SocketConnection::reportsOf(std::deque<Outgoing> unsent) {
+    std::vector<ErrorReport> reports;
+    for (Outgoing& each : unsent) {
+        if (each.whenUnsent) reports.push_back(std::move(each.whenUnsent));
+    }
+    return reports;
 }
 
 /// Sends on the caller's thread what the socket takes at once; the loop sees to the rest.
@@ -232,7 +249,7 @@ void SocketConnection::afterPush(bool isWithinBounds) {
 SocketConnection::Flushed SocketConnection::flush(int socket) {
     const std::lock_guard lock(outMutex_);
     if (!maySend()) return Flushed::some;
-    if (cannotSend_) out_.queue.clear();
+    if (cannotSend_) reportUnsent(reportsOf(std::exchange(out_.queue, {})));
     while (!out_.queue.empty()) {
         Outgoing& next = out_.queue.front();
         alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int) * ipc_bounds::kMostDescriptors)> control{};
@@ -257,7 +274,7 @@ SocketConnection::Flushed SocketConnection::flush(int socket) {
         if (count < 0 && errno == EAGAIN) return Flushed::some;
         if (count < 0) {
             cannotSend_ = true;
-            out_.queue.clear();
+            reportUnsent(reportsOf(std::exchange(out_.queue, {})));
             break;
         }
         out_.unsentDescriptors -= next.descriptors.size();

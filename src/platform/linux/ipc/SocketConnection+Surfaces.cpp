@@ -41,7 +41,7 @@ bool SocketConnection::pushReturns() {
         const Bytes one = dbus::serialize(reply);
         bytes.insert(bytes.end(), one.begin(), one.end());
     }
-    return pushBytes(std::move(bytes), {});
+    return push({std::move(bytes), 0, {}, nullptr});
 }
 
 /// When the next surfaces are due, if any wait.

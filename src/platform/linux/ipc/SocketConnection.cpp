@@ -31,7 +31,7 @@ SocketConnection::SocketConnection(Side side, UniqueFd socket, std::shared_ptr<S
     }
     const std::string greeting = dbus::clientGreeting(::getuid());
     const auto* first = reinterpret_cast<const std::byte*>(greeting.data());
-    out_.queue.push_back({Bytes(first, first + greeting.size()), 0, {}});
+    out_.queue.push_back({Bytes(first, first + greeting.size()), 0, {}, nullptr});
     out_.unsentBytes = greeting.size();
 }
 
@@ -72,6 +72,7 @@ void SocketConnection::close() {
         out_.awaited.clear();
         lent.swap(out_.lent);
     }
+    reportUnsent(reportsOf(std::move(unsent)));
     if (const Task release = release_.exchange(nullptr)) release();
 }
 
@@ -221,11 +222,11 @@ bool SocketConnection::authenticate() {
     const Socket held = socket();
     // So short that it fits into the socket's buffer, or the peer is up to no good. One that is gone already
     // may have said before what it wants.
-    if (!answers.empty() && held &&
-        ::send(held->get(), answers.data(), answers.size(), MSG_NOSIGNAL | MSG_DONTWAIT) !=
-            static_cast<ssize_t>(answers.size())) {
-        if (errno == EAGAIN) return cutOff("authentication that is not read"), false;
-        cannotSend_ = true;
+    if (!answers.empty() && held) {
+        const ssize_t sent = ::send(held->get(), answers.data(), answers.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
+        const bool isPart = sent >= 0 && sent < static_cast<ssize_t>(answers.size());
+        if (isPart || (sent < 0 && errno == EAGAIN)) return cutOff("authentication that is not read"), false;
+        if (sent < 0) cannotSend_ = true;
     }
     if (state == Talk::failed) return cutOff("authentication failed"), false;
     isAuthenticated_ = state == Talk::done;

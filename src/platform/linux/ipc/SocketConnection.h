@@ -40,7 +40,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
 
   protected:
     OptionalError transmit(std::size_t method, const IPCMethod& description, const Array& arguments,
-                           ReplyIdentifier identifier) override;
+                           ReplyIdentifier identifier, const ErrorReport& whenUnsent) override;
     void didResume() override;
     void didServe() override;
     bool runSoon(Task& task) override;
@@ -53,6 +53,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
         Bytes bytes;
         std::size_t sent = 0;
         std::vector<UniqueFd> descriptors;
+        ErrorReport whenUnsent;
     };
     /// What sending threads share, under `outMutex_`.
     struct Out {
@@ -95,12 +96,13 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     void answerError(const dbus::Message& call, const char* name, const std::string& text);
     void sendMessage(dbus::Message message);
     OptionalError sendCall(dbus::Message message, ReplyIdentifier identifier, std::size_t method,
-                           LentSurfaces surfaces);
+                           LentSurfaces surfaces, ErrorReport whenUnsent);
     // All under `outMutex_`.
     std::uint32_t nextSerial();
-    bool push(dbus::Message message);
-    bool pushBytes(Bytes bytes, std::vector<UniqueFd> descriptors);
+    bool push(dbus::Message message, ErrorReport whenUnsent = nullptr);
+    bool push(Outgoing outgoing);
     bool pushReturns();
+    static std::vector<ErrorReport> reportsOf(std::deque<Outgoing> unsent);
     void afterPush(bool isWithinBounds);
     Flushed flush(int socket);
 

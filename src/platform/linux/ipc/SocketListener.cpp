@@ -118,8 +118,9 @@ class SocketListener::Door : public SocketWatcher, public std::enable_shared_fro
     void turnAwayNext() {
         const std::lock_guard lock(mutex_);
         spare_ = UniqueFd();
-        const UniqueFd refused(::accept4(socket_.get(), nullptr, nullptr, SOCK_CLOEXEC));
+        UniqueFd refused(::accept4(socket_.get(), nullptr, nullptr, SOCK_CLOEXEC));
         KVLogError("IPC: turned away a client: no descriptors left");
+        refused.reset();  // makes room for the spare one again
         spare_ = openNothing();
     }
 
