@@ -56,11 +56,14 @@ void KVRecordingManager::saveVideoToCameraRoll(const URL& movieURL, ErrorHandler
 /// An application has its own movies, the system's shell all of them.
 bool KVRecordingManager::mayCallerSave(const URL& movieURL) const {
     if (!KVTemporaryFileStore::nameInStore(movieURL)) return false;
-    const auto active = sessionManager_->getActiveRecordingSessions();
-    if (std::ranges::any_of(active, [&](const auto& each) { return each->isWritingMovie(movieURL); }))
-        return false;
+    if (isBeingWritten(movieURL)) return false;
     const SessionRef session = getCallingConnectionRecordingSession();
     return clientHasSystemEntitlements() || (session && session->ownsMovie(movieURL));
+}
+
+bool KVRecordingManager::isBeingWritten(const URL& movieURL) const {
+    const auto active = sessionManager_->getActiveRecordingSessions();
+    return std::ranges::any_of(active, [&](const auto& each) { return each->isWritingMovie(movieURL); });
 }
 
 void KVRecordingManager::pauseRecording() {

@@ -31,17 +31,33 @@ void KVRecordingManager::saveFinishedMovie(const std::optional<URL>& movieURL,
     } else {
         KVLog("KVRecordingManager:saveVideoToCameraRoll: Video saved to camera roll successful");
         displayScreenRecorderBulletinWithURL(asset->localIdentifier);
-        KVLog("<Gallery>[Gallery][com.quillon.KelvoKit]: Saved screen recording.");
+        if (isPhotoLibraryChannelEnabled())
+            KVLog("<Gallery>[Gallery][com.quillon.KelvoKit]: Saved screen recording.");
     }
-    if (movieURL && file != movieURL) fileStore_->_srRemoveFile(*movieURL, nullptr);
+    if (movieURL && file != movieURL) removeSavedFile(*movieURL, nullptr);
     if (!file) {
         if (completion) completion(saveError);
         return;
     }
-    fileStore_->_srRemoveFile(*file, [saveError, completion](const OptionalError& error) {
+    removeSavedFile(*file, [saveError, completion](const OptionalError& error) {
         if (error) KVLogError("error removing file with code: %i", static_cast<int>(error->code()));
         if (completion) completion(error ? error : saveError);
     });
+}
+
+/// An application that records anew while its movie is saved has put another file in its place by then.
+void KVRecordingManager::removeSavedFile(const URL& url, ErrorHandler completion) {
+    if (!isBeingWritten(url)) {
+        fileStore_->_srRemoveFile(url, std::move(completion));
+    } else if (completion) {
+        completion(std::nullopt);
+    }
+}
+
+bool KVRecordingManager::isPhotoLibraryChannelEnabled() const {
+    return platform_.preferences->value("KVPhotoLibraryDiagnostics", kPreferencesDomain)
+        .asBool()
+        .value_or(false);
 }
 
 void KVRecordingManager::failedToSaveRecordingForRecordingSession(const SessionRef& session,

@@ -111,7 +111,9 @@ void KVRecordingManager::continueStart(const StartRequestRef& request) {
             if (const auto self = weakSelf.lock()) self->recordingStarted(*request);
         });
     });
-    if (request->systemRecording && !isStatusBarHidden()) showStatusBar(*request);
+    // The preference is looked at, and logged, for every recording; only that of the whole screen shows
+    // itself.
+    if (!isStatusBarHidden() && request->systemRecording) showStatusBar(*request);
 }
 
 bool KVRecordingManager::isDeviceReadyFor(const StartRequest& request) {

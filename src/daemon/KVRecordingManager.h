@@ -256,6 +256,9 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
     void currentSessionStopped(const std::optional<URL>& movieURL);
     void saveFinishedMovie(const std::optional<URL>& movieURL, const std::optional<URL>& mixedURL,
                            const ErrorHandler& completion);
+    void removeSavedFile(const URL& url, ErrorHandler completion);
+    /// Whether somebody follows what the photo library is given.
+    bool isPhotoLibraryChannelEnabled() const;
     void displayScreenRecorderBulletinWithURL(const std::string& localIdentifier);
 
     /// What must come to its end before the process does. Held by every stop and save under way; calls what
@@ -280,6 +283,7 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
     void finishRecordings(const WorkRef& work);
     void finishRecording(const SessionRef& session, const WorkRef& work);
     bool mayCallerSave(const URL& movieURL) const;
+    bool isBeingWritten(const URL& movieURL) const;
 
     const Platform platform_;
     const std::shared_ptr<KVLocalization> localization_;

@@ -4,8 +4,8 @@
 
 namespace kelvo {
 
-/// The display of the car that the device is connected to. Implemented by a Linux adapter without a car and
-/// by the simulated device. Any thread.
+/// The display of the car that the device is connected to. Implemented by the Linux adapter (a state file)
+/// and by the simulated device. Any thread.
 class InCarDisplay {
   public:
     virtual ~InCarDisplay() = default;

@@ -86,10 +86,13 @@ void KVRecordingSession::deliverMovie(const std::optional<URL>& movieURL, double
 void KVRecordingSession::finishAndCleanupSessionFilesWithHandler(CompletionHandler completion) {
     KVLog("KVRecordingSession: cleanupSessionFiles");
     stopRecordingWithNotification(false, std::nullopt);
+    services_.cleanUps->begin();
     services_.store->_srRemoveFile(
-        outputURL(), [completion = std::move(completion)](const OptionalError& error) {
+        outputURL(),
+        [cleanUps = services_.cleanUps, completion = std::move(completion)](const OptionalError& error) {
             if (error) KVLog("error removing file with code: %i", static_cast<int>(error->code()));
             if (completion) completion();
+            cleanUps->end();
         });
 }
 

@@ -20,7 +20,8 @@ void KVRecordingSession::startSessionWithHandler(CompletionHandler completion) {
         if (completion) completion();
     };
     if (broadcastProcessMode() == BroadcastProcessMode::movieClips) {
-        makeMovieWriter()->startWritingHandler(begin);
+        services_.cleanUps->afterwards(
+            [writer = makeMovieWriter(), begin] { writer->startWritingHandler(begin); });
     } else {
         notifyExtensionOfAction(ExtensionAction::start, begin);
     }

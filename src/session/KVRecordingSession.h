@@ -12,6 +12,7 @@
 #include "session/BroadcastExtensionLink.h"
 #include "session/KVRecordingSessionDelegate.h"
 #include "session/RecordingSession.h"
+#include "session/RunningCleanUps.h"
 #include "session/ShouldStopLock.h"
 #include "support/KVLocalization.h"
 #include "support/KVReportingAgent.h"
@@ -57,6 +58,8 @@ class KVRecordingSession : public RecordingSession,
         std::shared_ptr<KVUserErrors> errors;
         std::shared_ptr<CaptureManager> captureManager;
         MovieWriterFactory createMovieWriter;
+        /// Shared by the sessions whose movies can get the same name.
+        std::shared_ptr<RunningCleanUps> cleanUps = std::make_shared<RunningCleanUps>();
     };
     using CompletionHandler = std::function<void()>;
 

@@ -103,14 +103,13 @@ void KVApplicationStateMonitor::applicationStateDidChange(const ApplicationInfor
     KVLog("applicationStateDidChange: userInfo %s previousState %s", descriptionOf(update).c_str(),
           descriptionOf(previousState()).c_str());
     std::shared_ptr<KVSystemStateObserver> systemObserver;
-    bool hasObservers = false;
     {
         std::lock_guard lock(mutex_);
         systemObserver = systemObserver_;
-        hasObservers = !observers_.empty();
     }
     if (systemObserver) handleApplicationStateChange(*systemObserver, update);
-    if (hasObservers) notifyInAppSessionShouldPauseOrResume(update);
+    // Looked at now: what the system observer did counts.
+    if (hasObservers()) notifyInAppSessionShouldPauseOrResume(update);
 }
 
 void KVApplicationStateMonitor::handleApplicationStateChange(KVSystemStateObserver& observer,
@@ -136,7 +135,8 @@ void KVApplicationStateMonitor::notifyInAppSessionShouldPauseOrResume(const Appl
     {
         std::lock_guard lock(mutex_);
         if (const auto entry = observers_.find(process); entry != observers_.end()) observer = entry->second;
-        if (observer) previous = std::exchange(previousState_[process], update.state);
+        if (const auto known = previousState_.find(process); known != previousState_.end())
+            previous = known->second;
     }
     KVLog("%s processIdentifer %i observer nonnil %i", kName, process, observer ? 1 : 0);
     if (!observer) return;
@@ -148,7 +148,16 @@ void KVApplicationStateMonitor::notifyInAppSessionShouldPauseOrResume(const Appl
         KVLog("%s calling clientApplicationDidEnterBackground", kName);
         observer->clientApplicationDidEnterBackground();
     }
+    {
+        std::lock_guard lock(mutex_);
+        previousState_[process] = update.state;
+    }
     KVLog("%s state %i previousState %s", kName, update.state, descriptionOf(previousState()).c_str());
+}
+
+bool KVApplicationStateMonitor::hasObservers() const {
+    std::lock_guard lock(mutex_);
+    return !observers_.empty();
 }
 
 KVApplicationStateMonitor::States KVApplicationStateMonitor::previousState() const {

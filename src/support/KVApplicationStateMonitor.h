@@ -67,6 +67,7 @@ class KVApplicationStateMonitor : public std::enable_shared_from_this<KVApplicat
     void applicationStateDidChange(const ApplicationInformation& update);
     void handleApplicationStateChange(KVSystemStateObserver& observer, const ApplicationInformation& update);
     void notifyInAppSessionShouldPauseOrResume(const ApplicationInformation& update);
+    bool hasObservers() const;
     States previousState() const;
 
     const std::shared_ptr<ApplicationStateSource> source_;

@@ -27,13 +27,14 @@ class Answered {
   public:
     void set(Answer answer) { promise_.set_value(std::move(answer)); }
     std::optional<Answer> wait(std::chrono::milliseconds limit = std::chrono::seconds(30)) {
-        auto future = promise_.get_future();
-        return future.wait_for(limit) == std::future_status::ready ? std::optional(future.get())
-                                                                   : std::nullopt;
+        return future_.wait_for(limit) == std::future_status::ready ? std::optional(future_.get())
+                                                                    : std::nullopt;
     }
+    bool isSet() const { return future_.wait_for(std::chrono::seconds(0)) == std::future_status::ready; }
 
   private:
     std::promise<Answer> promise_;
+    std::future<Answer> future_ = promise_.get_future();
 };
 
 /// A program in a bundle of its own, and the test's hold on its connection: the daemon takes every request
@@ -102,13 +103,21 @@ class ClientProcess {
 
     std::optional<StartAnswer> start(const Wanted& wanted, Size size = {320, 480}) const {
         const auto answer = std::make_shared<Answered<StartAnswer>>();
-        daemon_->startRecordingWindowLayerContextIDs(
-            wanted.windows, size, wanted.microphone, false, wanted.broadcast, wanted.system, wanted.capture,
-            nullptr, [answer](const OptionalError& error, bool microphone, bool camera) {
-                answer->set({error ? error->code() : 0, microphone, camera});
-            });
+        requestStart(wanted, size, answer);
         return answer->wait();
     }
+    /// The same for a test that waits for the answer itself.
+    void requestStart(const Wanted& wanted, Size size,
+                      const std::shared_ptr<Answered<StartAnswer>>& answer) const {
+        daemon_->startRecordingWindowLayerContextIDs(
+            wanted.windows, size, wanted.microphone, false, wanted.broadcast, wanted.system, wanted.capture,
+            nullptr, [answer, told = startError_](const OptionalError& error, bool microphone, bool camera) {
+                told->set(error);
+                answer->set({error ? error->code() : 0, microphone, camera});
+            });
+    }
+    /// What the last answer to a start said of it.
+    OptionalError startError() const { return startError_->copy(); }
     std::optional<StopAnswer> stop(double startClip = 0, double endClip = 0) const {
         const auto answer = std::make_shared<Answered<StopAnswer>>();
         daemon_->stopRecordingWithStartClipDuration(
@@ -167,6 +176,7 @@ class ClientProcess {
     std::uint32_t window_ = 0;
     const std::shared_ptr<SocketLoop> loop_ = std::make_shared<SocketLoop>();
     const std::shared_ptr<FakeClientProxy> callbacks_ = std::make_shared<FakeClientProxy>();
+    const std::shared_ptr<Guarded<OptionalError>> startError_ = std::make_shared<Guarded<OptionalError>>();
     IPCConnectionRef connection_;
     std::unique_ptr<KVRemoteDaemon> daemon_;
 };

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "ClientProcess.h"
+#include "ipc/KVUserErrors.h"
 #include "support/Eventually.h"
 #include "support/SoundServer.h"
 #include "support/TemporaryDirectory.h"
@@ -16,6 +17,10 @@
 namespace kelvo::test {
 
 using namespace std::chrono_literals;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using StartAnswer = ClientProcess::StartAnswer;
+using Wanted = ClientProcess::Wanted;
 
 /// The real daemon on a root, a display with a window manager and, where it is started, a sound server of its
 /// own.
@@ -46,6 +51,19 @@ class RecordingFixture : public testing::Test {
     bool logs(const std::string& text) const {
         return eventually([&] { return log().find(text) != std::string::npos; }, 20s);
     }
+
+    std::size_t timesLogged(const std::string& text) const {
+        std::size_t times = 0;
+        const std::string all = log();
+        for (auto at = all.find(text); at != std::string::npos; at = all.find(text, at + 1))
+            ++times;
+        return times;
+    }
+    /// How often a client's view of the state was to be brought up to date; to most clients that is a line of
+    /// the log.
+    std::size_t stateUpdates() const { return timesLogged("ClientProxy:updateScreenRecordingState"); }
+    /// How often the user was asked, or would have been but for an exemption.
+    std::size_t askedTimes() const { return timesLogged("KVRecordingManager:showAcknowledgementAlert"); }
 
     /// The system's shell, which may record the whole screen.
     std::unique_ptr<ClientProcess> shell() const {
@@ -129,6 +147,37 @@ class RecordingFixture : public testing::Test {
             codes.push_back(stop.error ? stop.error->code() : 0);
         return codes;
     }
+
+    static Wanted wholeScreen() { return {{}, false, false, true, false}; }
+    static Wanted ownWindow(const ClientProcess& client) {
+        return {{client.window()}, false, false, false, false};
+    }
+    /// Starts what is refused with `code` and leaves everything as it was: nothing records, nothing is
+    /// stored, nobody is told, but for `updates` of the client's view of the state. Every error but that of a
+    /// broadcast without a set-up has a text for the user.
+    void expectRefusal(const ClientProcess& client, const Wanted& wanted, std::int64_t code,
+                       std::size_t updates) const {
+        const auto stored = store();
+        const auto saved = library();
+        const auto messages = client.told().messages();
+        const std::size_t updatesBefore = stateUpdates();
+        ASSERT_EQ(client.start(wanted), (StartAnswer{code, false, false})) << log();
+        ASSERT_TRUE(client.startError());
+        EXPECT_EQ(client.startError()->domain(), KVRecordingErrorDomain);
+        EXPECT_EQ(client.startError()->localizedDescription().empty(), code == -5808);
+        EXPECT_EQ(client.flag("isRecording"), false);
+        // The answer comes before the update; the question after both.
+        EXPECT_TRUE(eventually([&] { return stateUpdates() >= updatesBefore + updates; }, 20s)) << code;
+        EXPECT_EQ(stateUpdates(), updatesBefore + updates) << code;
+        EXPECT_EQ(store(), stored);
+        EXPECT_EQ(library(), saved);
+        EXPECT_EQ(client.told().messages(), messages);
+    }
+    void expectNothingKept() const {
+        EXPECT_TRUE(storeGetsEmpty()) << log();
+        EXPECT_THAT(library(), IsEmpty());
+    }
+
     static void pass(std::chrono::milliseconds time) { std::this_thread::sleep_for(time); }
 
     const TemporaryDirectory root_;

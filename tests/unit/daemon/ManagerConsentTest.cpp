@@ -108,52 +108,68 @@ INSTANTIATE_TEST_SUITE_P(
                              "BROADCAST_ALERT_ACCEPT_BUTTON_1", "BROADCAST_ALERT_ACCEPT_BUTTON_2"}),
     [](const auto& test) { return test.param.name; });
 
-TEST_F(ManagerConsentTest, FullConsentChangesNothingAndExempts) {
-    want(true, true);
-    EXPECT_TRUE(ask(SystemAlertResponse::alternateButton));
-    EXPECT_TRUE(manager->isMicrophoneRecording() && manager->isCameraRecording());
-    EXPECT_TRUE(asking->daemonMicrophoneConsent);
-    EXPECT_THAT(exempt(), ElementsAre("app"));
-    EXPECT_THAT(exemptWithMicrophone(), ElementsAre("app"));
-    EXPECT_TRUE(log.contains("user acknowledged recording"));
+/// What was to be recorded, the button, and what is recorded then.
+struct AnswerCase {
+    const char* name;
+    bool microphone;
+    bool camera;
+    SystemAlertResponse button;
+    bool isMicrophoneLeft;
+    bool isCameraLeft;
+    const char* logged;
+};
+
+class ManagerConsentAnswerTest : public ManagerConsentTest, public testing::WithParamInterface<AnswerCase> {};
+
+TEST_P(ManagerConsentAnswerTest, ButtonDecidesWhatIsRecordedAndExempts) {
+    const AnswerCase& row = GetParam();
+    for (const bool isBroadcast : {false, true}) {
+        manager->exemptBundleIdentifiers().set({});
+        manager->exemptWithMicRecordingEnabledBundleIdentifiers().set({});
+        asking->daemonMicrophoneConsent = !row.isMicrophoneLeft;
+        want(row.microphone, row.camera);
+        EXPECT_TRUE(ask(row.button, isBroadcast));
+        EXPECT_EQ(manager->isMicrophoneRecording(), row.isMicrophoneLeft);
+        EXPECT_EQ(manager->isCameraRecording(), row.isCameraLeft);
+        EXPECT_EQ(asking->daemonMicrophoneConsent, row.isMicrophoneLeft);
+        EXPECT_THAT(exempt(), ElementsAre("app"));
+        EXPECT_EQ(exemptWithMicrophone().size(), row.isMicrophoneLeft ? 1U : 0U);
+        EXPECT_EQ(log.count(row.logged), isBroadcast ? 2U : 1U);
+    }
 }
 
-TEST_F(ManagerConsentTest, FullConsentToTheCameraAloneIsNoneToTheMicrophone) {
-    want(false, true);
-    EXPECT_TRUE(ask(SystemAlertResponse::alternateButton));
-    EXPECT_FALSE(asking->daemonMicrophoneConsent);
-    EXPECT_THAT(exempt(), ElementsAre("app"));
-    EXPECT_THAT(exemptWithMicrophone(), IsEmpty());
-}
+constexpr auto kFull = SystemAlertResponse::alternateButton;
+constexpr auto kLess = SystemAlertResponse::otherButton;
+constexpr const char* kAcknowledged = "user acknowledged recording";
+constexpr const char* kWithoutCamera = "user acknowledged recording, but camera recording is disabled";
+constexpr const char* kWithoutMicrophone =
+    "user acknowledged recording, but microphone recording is disabled";
 
-TEST_F(ManagerConsentTest, SecondButtonTakesCameraAndMicrophoneAway) {
-    want(true, true);
-    asking->daemonMicrophoneConsent = true;
-    EXPECT_TRUE(ask(SystemAlertResponse::otherButton));
-    EXPECT_FALSE(manager->isMicrophoneRecording() || manager->isCameraRecording());
-    EXPECT_FALSE(asking->daemonMicrophoneConsent);
-    EXPECT_THAT(exempt(), ElementsAre("app"));
-    EXPECT_THAT(exemptWithMicrophone(), IsEmpty());
-    EXPECT_TRUE(log.contains("user acknowledged recording, but camera recording is disabled"));
-}
-
-TEST_F(ManagerConsentTest, SecondButtonWithoutACameraTakesTheMicrophoneAway) {
-    want(true, false);
-    EXPECT_TRUE(ask(SystemAlertResponse::otherButton));
-    EXPECT_FALSE(manager->isMicrophoneRecording());
-    EXPECT_THAT(exempt(), ElementsAre("app"));
-    EXPECT_THAT(exemptWithMicrophone(), IsEmpty());
-    EXPECT_TRUE(log.contains("user acknowledged recording, but microphone recording is disabled"));
-}
+INSTANTIATE_TEST_SUITE_P(
+    Rows, ManagerConsentAnswerTest,
+    testing::Values(AnswerCase{"AllOfBoth", true, true, kFull, true, true, kAcknowledged},
+                    AnswerCase{"AllOfTheCameraAlone", false, true, kFull, false, true, kAcknowledged},
+                    AnswerCase{"AllOfTheMicrophoneAlone", true, false, kFull, true, false, kAcknowledged},
+                    AnswerCase{"LessThanBoth", true, true, kLess, false, false, kWithoutCamera},
+                    AnswerCase{"LessThanTheCameraAlone", false, true, kLess, false, false, kWithoutCamera},
+                    AnswerCase{"LessThanTheMicrophoneAlone", true, false, kLess, false, false,
+                               kWithoutMicrophone},
+                    AnswerCase{"Neither", false, false, kLess, false, false, kWithoutMicrophone}),
+    [](const auto& test) { return test.param.name; });
 
 TEST_F(ManagerConsentTest, RefusalLeavesNothingBehind) {
     for (const auto response : {SystemAlertResponse::defaultButton, SystemAlertResponse::cancelled}) {
-        want(true, true);
-        EXPECT_FALSE(ask(response));
-        EXPECT_TRUE(manager->isMicrophoneRecording() && manager->isCameraRecording());
+        for (const bool microphone : {false, true}) {
+            for (const bool camera : {false, true}) {
+                want(microphone, camera);
+                EXPECT_FALSE(ask(response));
+                EXPECT_EQ(manager->isMicrophoneRecording(), microphone);
+                EXPECT_EQ(manager->isCameraRecording(), camera);
+            }
+        }
     }
     EXPECT_THAT(exempt(), IsEmpty());
-    EXPECT_EQ(log.count("user refused recording"), 2U);
+    EXPECT_EQ(log.count("user refused recording"), 8U);
 }
 
 TEST_F(ManagerConsentTest, AlertThatCannotBeShownIsARefusal) {

@@ -93,6 +93,7 @@ TEST_F(ManagerRequestTest, StopFinishesTheCallersRecording) {
     manager->stopRecordingWithHandler(answered);
     recording->completeFinish(URL("file:///m"), std::nullopt);
     EXPECT_THAT(movies, ElementsAre(URL("file:///m")));
+    EXPECT_THAT(recording->clips, ElementsAre(test::FakeRecordingSession::Clip{0, 0})) << "nothing is cut";
     EXPECT_TRUE(log.contains("KVRecordingManager: stopRecordingWithHandler:"));
     EXPECT_TRUE(log.contains("KVRecordingManager: stopRecordingWithStartTimeOffset:endTimeOffset:handler:"));
 }

@@ -36,6 +36,8 @@ class ManagerSaveTest : public test::ManagerFixture {
     bool exists(const std::string& path) { return device.fileSystem->itemExists(path); }
 
     static inline const std::string kMovie = std::string(kStore) + "/movie.mp4";
+    static inline const std::string kDiagnostics =
+        "<Gallery>[Gallery][com.quillon.KelvoKit]: Saved screen recording.";
     Guarded<std::vector<std::int64_t>> answers;
 };
 
@@ -50,8 +52,27 @@ TEST_F(ManagerSaveTest, MixedMovieIsSavedAndNothingStays) {
     EXPECT_FALSE(exists(item.moviePath));
     EXPECT_TRUE(
         log.contains("KVRecordingManager:saveVideoToCameraRoll: Video saved to camera roll successful"));
-    EXPECT_TRUE(log.contains("<Gallery>[Gallery][com.quillon.KelvoKit]: Saved screen recording."));
+    EXPECT_FALSE(log.contains(kDiagnostics)) << "nobody asked for them";
     EXPECT_THAT(device.alerts->shownAlerts(), IsEmpty());
+}
+
+TEST_F(ManagerSaveTest, SaveIsToldToWhoeverFollowsThePhotoLibrary) {
+    device.preferences->set("KVPhotoLibraryDiagnostics", true);
+    save(URL::file(kMovie));
+    EXPECT_EQ(log.count(kDiagnostics), 1U);
+}
+
+TEST_F(ManagerSaveTest, NewRecordingOfTheSameNameIsNotTakenForTheSavedOne) {
+    recordingSession("app")->ownMovie = URL::file(kMovie);
+    for (const int mixError : {0, ENOSPC}) {
+        answers.set({});
+        if (mixError != 0) device.failNext("ExportSession.export", mixError);
+        save(URL::file(kMovie));
+        EXPECT_THAT(answers.copy(), ElementsAre(0));
+        EXPECT_TRUE(exists(kMovie));
+    }
+    EXPECT_EQ(device.photoLibrary->items().size(), 2U);
+    EXPECT_FALSE(exists(device.photoLibrary->items().front().moviePath)) << "the mixed one goes";
 }
 
 TEST_F(ManagerSaveTest, UnmixedMovieIsSavedWhenMixingFails) {

@@ -176,6 +176,17 @@ TEST_F(ManagerStartTest, PresentPreferenceHidesTheStatusBarOnInternalBuildsOnly)
     EXPECT_EQ(log.count("KVRecordingManager: hideStatusBar=1"), 1U);
 }
 
+TEST_F(ManagerStartTest, PreferenceOfTheStatusBarIsLookedAtForApplicationsToo) {
+    accept();
+    startInApp();
+    EXPECT_FALSE(log.contains("KVRecordingManager: hideStatusBar=0")) << "not an internal build";
+    application->recording = false;
+    device.device->setInternalBuild(true);
+    startInApp();
+    EXPECT_EQ(log.count("KVRecordingManager: hideStatusBar=0"), 1U);
+    EXPECT_EQ(manager->statusBarAssertion()->processIdentifier(), 0) << "an application shows none";
+}
+
 TEST_F(ManagerStartTest, ActiveInCarDisplayRefuses) {
     device.inCarDisplay->setActive(true);
     startInApp();
@@ -224,6 +235,25 @@ TEST_F(ManagerStartTest, RepeatedStartOfTheSystemRecordingEndsTheFirstBeforeTheS
     EXPECT_THAT(answers, ElementsAre(Answer{0, true, false}));
     EXPECT_EQ(system->client->messages().front(), kUpdate);
     EXPECT_EQ(system->start, nullptr) << "nothing is changed";
+}
+
+TEST_F(ManagerStartTest, RepeatedStartOfAnApplicationThrowsTheFirstRecordingAwayAndBeginsAnother) {
+    accept();
+    startInApp();
+    application->completeStart();
+    application->requests.clear();
+    startInApp();
+    EXPECT_EQ(application->requests.front(), "finishAndCleanupSessionFiles");
+    EXPECT_EQ(application->requests.back(), "startSession");
+    EXPECT_TRUE(application->recording);
+    application->completeCleanup();
+    EXPECT_THAT(stopCodes(*application), ElementsAre(-5806));
+    EXPECT_FALSE(application->client->stops.copy().front().movieURL);
+    EXPECT_EQ(answers.size(), 1U) << "capturing has not begun again";
+    application->completeStart();
+    EXPECT_THAT(answers, ElementsAre(Answer{0, true, false}, Answer{0, true, false}));
+    EXPECT_TRUE(application->recording);
+    EXPECT_EQ(device.alerts->shownAlerts().size(), 1U) << "exempt by now";
 }
 
 TEST_F(ManagerStartTest, FreeSpaceMustBeAboveTheBound) {
@@ -322,6 +352,20 @@ TEST_F(ManagerStartTest, LayoutIsWatchedFromTheFirstStartOnce) {
     EXPECT_EQ(device.displayLayout->observerCount(), 1U);
     application->recording = false;
     startInApp();
+    EXPECT_EQ(device.displayLayout->monitorCount(), 1);
+}
+
+/// The monitor is made, and watched, once in the daemon's life; the end of a recording ends the watch.
+TEST_F(ManagerStartTest, LayoutIsNotWatchedAgainAfterAStop) {
+    accept();
+    startInApp();
+    application->completeStart();
+    manager->stopRecordingWithHandler([](const auto&, const auto&) {});
+    application->completeFinish(std::nullopt, std::nullopt);
+    EXPECT_EQ(device.displayLayout->observerCount(), 0U);
+    startInApp();
+    EXPECT_TRUE(application->recording);
+    EXPECT_EQ(device.displayLayout->observerCount(), 0U);
     EXPECT_EQ(device.displayLayout->monitorCount(), 1);
 }
 

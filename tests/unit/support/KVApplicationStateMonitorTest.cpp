@@ -13,9 +13,17 @@ using testing::IsEmpty;
 
 class Client : public KVApplicationStateObserver {
   public:
-    void clientApplicationDidEnterBackground() override { events.emplace_back("background"); }
-    void clientApplicationDidEnterForeground() override { events.emplace_back("foreground"); }
+    void clientApplicationDidEnterBackground() override { note("background"); }
+    void clientApplicationDidEnterForeground() override { note("foreground"); }
     std::vector<std::string> events;
+    /// When set, is run by each event.
+    std::function<void()> onEvent;
+
+  private:
+    void note(const std::string& event) {
+        events.push_back(event);
+        if (onEvent) onEvent();
+    }
 };
 
 class System : public KVSystemStateObserver {
@@ -26,10 +34,13 @@ class System : public KVSystemStateObserver {
         note("background", process);
     }
     std::vector<std::string> events;
+    /// When set, is run by each event.
+    std::function<void()> onEvent;
 
   private:
     void note(const std::string& event, std::int32_t process) {
         events.push_back(event + " " + std::to_string(process));
+        if (onEvent) onEvent();
     }
 };
 
@@ -122,6 +133,26 @@ TEST_F(KVApplicationStateMonitorTest, ProcessWithoutAnObserverKeepsItsPreviousSt
     EXPECT_TRUE(log.contains(
         "notifyInAppSessionShouldPauseOrResume: state 8 previousState {\"10\" = 8; \"11\" = 8}"));
     EXPECT_THAT(client->events, IsEmpty());
+}
+
+TEST_F(KVApplicationStateMonitorTest, NewStateCountsOnceItsClientHasHeardOfIt) {
+    change(10, 8);
+    monitor->addObserver(client, 10);
+    client->onEvent = [this] { monitor->addObserver(std::make_shared<Client>(), 11); };
+    change(10, 4);
+    EXPECT_THAT(client->events, ElementsAre("background"));
+    EXPECT_TRUE(
+        log.contains("addObserver:processIdentifier: processIdentifier 11 userInfo (none) "
+                     "previousState {\"10\" = 8}"));
+    EXPECT_TRUE(log.contains("notifyInAppSessionShouldPauseOrResume: state 4 previousState {\"10\" = 4}"));
+}
+
+TEST_F(KVApplicationStateMonitorTest, ObserverThatTheSystemsNewsBringCounts) {
+    monitor->addSystemObserver(system);
+    change(10, 4);
+    system->onEvent = [this] { monitor->addObserver(client, 11); };
+    change(10, 2);
+    EXPECT_TRUE(log.contains("notifyInAppSessionShouldPauseOrResume: processIdentifer 10 observer nonnil 0"));
 }
 
 TEST_F(KVApplicationStateMonitorTest, TerminatedApplicationBehindTheFrontEndsAndLeaves) {

@@ -3,7 +3,6 @@
 #include "platform/Accessibility.h"
 #include "platform/BulletinService.h"
 #include "platform/CallObserver.h"
-#include "platform/InCarDisplay.h"
 #include "platform/RestrictionsProfile.h"
 
 #include <cerrno>
@@ -52,12 +51,6 @@ class InvisibleBulletins : public BulletinService {
 class UnreadScreen : public Accessibility {
   public:
     bool isScreenReaderRunning() override { return false; }
-};
-
-/// A device that is in no car.
-class NoInCarDisplay : public InCarDisplay {
-  public:
-    Result<bool> isActive() override { return false; }
 };
 
 }  // namespace kelvo

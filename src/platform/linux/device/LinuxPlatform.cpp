@@ -11,6 +11,7 @@
 #include "platform/linux/notifications/LinuxNotificationCenter.h"
 #include "platform/linux/pulse/PulseAudioService.h"
 #include "platform/linux/settings/DeviceFile.h"
+#include "platform/linux/settings/InCarDisplayFile.h"
 #include "platform/linux/settings/JsonPreferences.h"
 #include "platform/linux/sounds/PulseSystemSounds.h"
 #include "platform/linux/storage/VolumeWatcher.h"
@@ -60,7 +61,7 @@ Platform linuxPlatform(const std::shared_ptr<const DeviceRoot>& root, const std:
     platform.sounds = std::make_shared<PulseSystemSounds>(root);
     platform.applications = std::make_shared<x11::X11Applications>("", platform.bundles);
     platform.accessibility = std::make_shared<UnreadScreen>();
-    platform.inCarDisplay = std::make_shared<NoInCarDisplay>();
+    platform.inCarDisplay = std::make_shared<InCarDisplayFile>(root);
     return platform;
 }
 
