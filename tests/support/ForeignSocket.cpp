@@ -4,6 +4,7 @@
 
 #include <array>
 #include <csignal>
+#include <sys/prctl.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <sys/wait.h>
@@ -14,6 +15,7 @@ namespace {
 
 /// The process's life. Forked from a process with threads, so nothing but system calls.
 [[noreturn]] void run(int parent, const sockaddr_un& address) {
+    ::prctl(PR_SET_PDEATHSIG, SIGKILL);  // a test that crashes leaves nobody behind
     char go = 0;
     if (::read(parent, &go, 1) != 1) ::_exit(1);
     const int connection = ::socket(AF_UNIX, SOCK_STREAM, 0);
