@@ -71,7 +71,7 @@ std::vector<float> decodedSound(const std::string& path, const std::string& stre
         outputOf("ffmpeg -nostdin -v error -i " + quoted(path) + " -map 0:" + stream +
                  " -af aresample=async=0:first_pts=0,pan=mono\\|c0=c0 -ar 44100 -f f32le -");
     std::vector<float> samples(bytes.size() / sizeof(float));
-    std::memcpy(samples.data(), bytes.data(), samples.size() * sizeof(float));
+    if (!samples.empty()) std::memcpy(samples.data(), bytes.data(), samples.size() * sizeof(float));
     return samples;
 }
 

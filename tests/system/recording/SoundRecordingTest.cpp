@@ -135,7 +135,7 @@ TEST_F(SoundRecordingTest, CaptureBringsTheApplicationsSound) {
         [&] {
             client->told().videoSamples.exchange({});  // lets the frames go
             const auto sound = soundOf(client->told().audioSamples.copy());
-            return sound.size() > 44100 && amplitudeOf(kPlayed, sound) > 4000;
+            return sound.size() > 44100 && amplitudeOf(kPlayed, std::span(sound).last(11025)) > 4000;
         },
         20s));
     const auto samples = client->told().audioSamples.copy();
@@ -172,7 +172,7 @@ class ShutterSoundTest : public SoundRecordingFixture {
         std::ifstream file(heard_, std::ios::binary);
         const std::string bytes{std::istreambuf_iterator<char>(file), {}};
         std::vector<std::int16_t> samples(bytes.size() / 2);
-        std::memcpy(samples.data(), bytes.data(), samples.size() * 2);
+        if (!samples.empty()) std::memcpy(samples.data(), bytes.data(), samples.size() * 2);
         return samples;
     }
     /// Where, from sample `begin` on, the note sounds strongest; none when it does not sound.

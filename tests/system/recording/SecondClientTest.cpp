@@ -67,7 +67,7 @@ TEST_F(SecondClientTest, RecordingOfTheScreenThrowsAnApplicationsAway) {
     pass(1000ms);
     const auto stopped = client->stop();
     ASSERT_TRUE(stopped && !stopped->movie.empty()) << log();
-    EXPECT_GT(countedIn(stopped->movie), 8U);
+    EXPECT_GT(countedIn(stopped->movie), 5U);
     EXPECT_THAT(store(), ElementsAre(testing::HasSubstr("/ScreenRecording_"))) << "nothing else is left";
     EXPECT_EQ(client->save(stopped->movie), 0);
     EXPECT_EQ(library().size(), 1U);
