@@ -8,7 +8,7 @@
 #include "ipc/KVClientProtocolTable.h"
 #include "ipc/KVClientProxy.h"
 #include "platform/linux/ipc/SocketTransport.h"
-#include "support/FakeDaemon.h"
+#include "support/OpenDoor.h"
 #include "support/TemporaryDirectory.h"
 
 #include <algorithm>
@@ -145,23 +145,6 @@ class Other {
     pid_t process_ = -1;
 };
 
-/// Keeps the one client.
-class Door : public IPCListenerDelegate {
-  public:
-    bool listenerShouldAcceptNewConnection(IPCListener&, const IPCConnectionRef& connection) override {
-        connection->setExported(interfaceOf<KVDaemonProtocol>(),
-                                std::make_shared<ProtocolDispatcher<KVDaemonProtocol>>(daemon_));
-        connection->setRemoteInterface(interfaceOf<KVClientProtocol>());
-        connection->resume();
-        client.set(connection);
-        return true;
-    }
-    Guarded<IPCConnectionRef> client;
-
-  private:
-    const std::shared_ptr<test::FakeDaemon> daemon_ = std::make_shared<test::FakeDaemon>();
-};
-
 /// Log lines are written as far as the journal; the journal's own work is not ours.
 struct Nowhere : LogSink {
     void write(LogLevel, std::string_view) override {}
@@ -172,7 +155,7 @@ std::pair<double, Report> measureCapture(std::chrono::nanoseconds interval) {
     const Other client([&] { return application(root.path() + "/run/kelvod/com.quillon.kelvod"); });
     setLogSink(std::make_shared<Nowhere>());
     SocketTransport transport(std::make_shared<const DeviceRoot>(root.path(), ""), nullptr);
-    const auto door = std::make_shared<Door>();
+    const auto door = std::make_shared<test::OpenDoor>();
     const auto listener = transport.createListener("com.quillon.kelvod");
     listener->setDelegate(door);
     listener->resume();

@@ -7,18 +7,14 @@ A program lets the screen of 1080x1920 flash and beeps at the same instant, once
 Flashes for which the program or the sound server were late themselves, as they say, do not count. Needs Xvfb, pulseaudio,
 ffmpeg, and the programs kelvod, kelvoctl and flash_program in the build folder.
 """
-import argparse
 import array
-import contextlib
 import os
-import pathlib
 import statistics
 import subprocess
-import tempfile
 import threading
 import time
 
-from recording import HEIGHT, WIDTH, Daemon, running, start_display, start_sound
+from recording import HEIGHT, WIDTH, command_line, running, stage
 
 RATE = 44100
 BLOCK = RATE // 1000  # samples: a millisecond
@@ -113,19 +109,10 @@ class MemoryWatch:
 
 
 def main():
-    parser = argparse.ArgumentParser()
-    parser.add_argument("build", nargs="?", type=pathlib.Path,
-                        default=pathlib.Path(__file__).resolve().parents[1] / "build/release")
+    parser = command_line()
     parser.add_argument("--minutes", type=float, default=30)
     arguments = parser.parse_args()
-    os.environ["DBUS_SYSTEM_BUS_ADDRESS"] = "unix:path=/nonexistent"
-    with tempfile.TemporaryDirectory() as name, contextlib.ExitStack() as stack:
-        folder = pathlib.Path(name)
-        os.environ["XDG_RUNTIME_DIR"] = name
-        start_display(stack)
-        start_sound(stack, folder)
-        daemon = Daemon(arguments.build.resolve(), folder)
-        stack.callback(lambda: (daemon.process.terminate(), daemon.process.wait()))
+    with stage(arguments.build) as (daemon, folder):
         with open(folder / "log", "w+") as log, running(daemon.build / "flash_program", os.environ["DISPLAY"], WIDTH,
                                                         HEIGHT, 1000, stderr=log):
             time.sleep(1)

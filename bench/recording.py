@@ -226,22 +226,34 @@ def start_display(stack):
     os.environ["DISPLAY"] = ":" + os.read(reading, 100).decode().strip()
 
 
-def main():
+def command_line():
     parser = argparse.ArgumentParser()
     parser.add_argument("build", nargs="?", type=pathlib.Path,
                         default=pathlib.Path(__file__).resolve().parents[1] / "build/release")
-    parser.add_argument("--seconds", type=float, default=20)
-    parser.add_argument("--recordings", type=int, default=200)
-    parser.add_argument("--long", type=float, default=60)
-    arguments = parser.parse_args()
+    return parser
+
+
+@contextlib.contextmanager
+def stage(build):
+    """A daemon with a screen and sound to record, and a folder for movies; all gone afterwards."""
     os.environ["DBUS_SYSTEM_BUS_ADDRESS"] = "unix:path=/nonexistent"
     with tempfile.TemporaryDirectory() as name, contextlib.ExitStack() as stack:
         folder = pathlib.Path(name)
         os.environ["XDG_RUNTIME_DIR"] = name
         start_display(stack)
         start_sound(stack, folder)
-        daemon = Daemon(arguments.build.resolve(), folder)
+        daemon = Daemon(build.resolve(), folder)
         stack.callback(lambda: (daemon.process.terminate(), daemon.process.wait()))
+        yield daemon, folder
+
+
+def main():
+    parser = command_line()
+    parser.add_argument("--seconds", type=float, default=20)
+    parser.add_argument("--recordings", type=int, default=200)
+    parser.add_argument("--long", type=float, default=60)
+    arguments = parser.parse_args()
+    with stage(arguments.build) as (daemon, folder):
         print(f"{'':44} {'kelvod':>9} {'ffmpeg':>9} {'ratio':>7}")
         compare(daemon, folder, "moving screen", 1, 0.70, arguments.seconds)
         compare(daemon, folder, "screen that moves a quarter of the time", 0.25, 0.35, arguments.seconds)

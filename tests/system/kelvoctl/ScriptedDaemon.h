@@ -5,6 +5,7 @@
 #include "platform/linux/ipc/SocketTransport.h"
 #include "support/Eventually.h"
 #include "support/FakeDaemon.h"
+#include "support/OpenDoor.h"
 #include "support/TemporaryDirectory.h"
 
 #include <atomic>
@@ -58,26 +59,6 @@ class ScriptedDaemon : public FakeDaemon {
     Guarded<OptionalError> stopError;
     Guarded<OptionalError> saveError;
     Guarded<std::optional<URL>> movie;
-};
-
-/// Lets every client in.
-class OpenDoor : public IPCListenerDelegate {
-  public:
-    explicit OpenDoor(std::shared_ptr<ScriptedDaemon> daemon) : daemon_(std::move(daemon)) {}
-
-    bool listenerShouldAcceptNewConnection(IPCListener&, const IPCConnectionRef& connection) override {
-        connection->setExported(interfaceOf<KVDaemonProtocol>(),
-                                std::make_shared<ProtocolDispatcher<KVDaemonProtocol>>(daemon_));
-        connection->setRemoteInterface(interfaceOf<KVClientProtocol>());
-        connection->resume();
-        client.set(connection);
-        return true;
-    }
-
-    Guarded<IPCConnectionRef> client;
-
-  private:
-    const std::shared_ptr<ScriptedDaemon> daemon_;
 };
 
 class KelvoctlRecordingTest : public testing::Test {

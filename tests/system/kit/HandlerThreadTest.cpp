@@ -2,7 +2,7 @@
 #include "platform/linux/ipc/SocketTransport.h"
 #include "support/ChildProcess.h"
 #include "support/Eventually.h"
-#include "support/FakeDaemon.h"
+#include "support/OpenDoor.h"
 #include "support/TemporaryDirectory.h"
 #include "support/Threads.h"
 
@@ -19,24 +19,7 @@ namespace {
 
 using kelvokit::Recorder;
 using test::eventually;
-
-/// Lets every client in.
-class OpenDoor : public IPCListenerDelegate {
-  public:
-    bool listenerShouldAcceptNewConnection(IPCListener&, const IPCConnectionRef& connection) override {
-        connection->setExported(interfaceOf<KVDaemonProtocol>(),
-                                std::make_shared<ProtocolDispatcher<KVDaemonProtocol>>(daemon_));
-        connection->setRemoteInterface(interfaceOf<KVClientProtocol>());
-        connection->resume();
-        client.set(connection);
-        return true;
-    }
-
-    Guarded<IPCConnectionRef> client;
-
-  private:
-    const std::shared_ptr<test::FakeDaemon> daemon_ = std::make_shared<test::FakeDaemon>();
-};
+using test::OpenDoor;
 
 /// Recorders with the library's own threads, before a daemon that answers at once.
 class HandlerThreadTest : public testing::Test {
