@@ -18,7 +18,7 @@ TEST_F(MicrophoneTest, TrackHoldsWhatTheMicrophoneHears) {
     ASSERT_TRUE(hears(microphone, 440));
     EXPECT_TRUE(hearsOnly(microphone, 440, 1000));
     const auto heard = microphone.next(1);
-    EXPECT_LT(test::worstSeam(heard), 0.002);
+    EXPECT_LT(test::worstSeam(heard), 0.01);  // a buffer that is missing would be 0.02
     const double now = std::chrono::duration<double>(platform.clock->monotonicNow()).count();
     EXPECT_NEAR(heard.back()->presentationTime().seconds(), now, 0.5);
 }
@@ -28,7 +28,7 @@ TEST_F(MicrophoneTest, SilentMicrophoneYieldsSilenceNotAGap) {
     microphone.next(1);  // what the server says first of its latency is some milliseconds off
     const auto heard = microphone.next(1);
     EXPECT_LT(amplitudeIn(heard, 440), 1);
-    EXPECT_LT(test::worstSeam(heard), 0.002);
+    EXPECT_LT(test::worstSeam(heard), 0.01);  // a buffer that is missing would be 0.02
 }
 
 TEST_F(MicrophoneTest, MicrophoneFollowsTheDefaultSource) {
