@@ -24,30 +24,38 @@ const std::uint8_t* pixels(const VideoSurface& surface) {
 
 }  // namespace
 
-AVFrame* FrameConverter::convert(const VideoSurface& surface) {
-    if (!prepareFrame()) return nullptr;
+FramePointer FrameConverter::convert(const VideoSurface& surface) {
+    Canvas* const canvas = freeCanvas();
+    if (canvas == nullptr) return nullptr;
+    const AVFrame& frame = *canvas->frame;
     const int width = static_cast<int>(surface.width());
     const int height = static_cast<int>(surface.height());
     // An odd side was rounded up to even: such a picture is not scaled by half a pixel.
     const bool isWholeFrame = width + width % 2 == width_ && height + height % 2 == height_;
     const Rectangle target = isWholeFrame ? Rectangle{0, 0, width, height} : fit(width, height);
-    if (target != filled_) blacken();
-    filled_ = target;
+    if (target != canvas->filled) blacken(frame);
+    canvas->filled = target;
     if (isWholeFrame) {
-        libyuv::ARGBToI420(pixels(surface), stride(surface), frame_->data[0], frame_->linesize[0],
-                           frame_->data[1], frame_->linesize[1], frame_->data[2], frame_->linesize[2], width,
-                           height);
+        libyuv::ARGBToI420(pixels(surface), stride(surface), frame.data[0], frame.linesize[0], frame.data[1],
+                           frame.linesize[1], frame.data[2], frame.linesize[2], width, height);
     } else {
-        scaleInto(surface, target);
+        scaleInto(frame, surface, target);
     }
-    return frame_.get();
+    return FramePointer(av_frame_clone(&frame));
 }
 
-/// Makes the frame when there is none, or one of its own when the encoder still reads the last.
-bool FrameConverter::prepareFrame() {
-    if (frame_) return av_frame_make_writable(frame_.get()) >= 0;
+/// One that nobody else holds, made when there is none. There are as many as were ever held at a time.
+FrameConverter::Canvas* FrameConverter::freeCanvas() {
+    const auto isFree = [](const Canvas& canvas) { return av_frame_is_writable(canvas.frame.get()) != 0; };
+    const auto free = std::ranges::find_if(canvases_, isFree);
+    if (free != canvases_.end()) return &*free;
+    FramePointer frame = makeFrame();
+    return frame ? &canvases_.emplace_back(std::move(frame), Rectangle{}) : nullptr;
+}
+
+FramePointer FrameConverter::makeFrame() const {
     FramePointer frame(av_frame_alloc());
-    if (!frame) return false;
+    if (!frame) return nullptr;
     frame->format = AV_PIX_FMT_YUV420P;
     frame->width = width_;
     frame->height = height_;
@@ -55,9 +63,7 @@ bool FrameConverter::prepareFrame() {
     frame->color_trc = AVCOL_TRC_SMPTE170M;
     frame->colorspace = AVCOL_SPC_SMPTE170M;
     frame->color_range = AVCOL_RANGE_MPEG;
-    if (av_frame_get_buffer(frame.get(), 0) < 0) return false;
-    frame_ = std::move(frame);
-    return true;
+    return av_frame_get_buffer(frame.get(), 0) < 0 ? nullptr : std::move(frame);
 }
 
 FrameConverter::Rectangle FrameConverter::fit(int width, int height) const {
@@ -70,16 +76,16 @@ FrameConverter::Rectangle FrameConverter::fit(int width, int height) const {
     return target;
 }
 
-void FrameConverter::blacken() {
+void FrameConverter::blacken(const AVFrame& frame) const {
     constexpr std::uint8_t kBlack = 16;
     constexpr std::uint8_t kNoColour = 128;
-    libyuv::SetPlane(frame_->data[0], frame_->linesize[0], width_, height_, kBlack);
+    libyuv::SetPlane(frame.data[0], frame.linesize[0], width_, height_, kBlack);
     for (int plane = 1; plane < 3; ++plane)
-        libyuv::SetPlane(frame_->data[plane], frame_->linesize[plane], width_ / 2, height_ / 2, kNoColour);
+        libyuv::SetPlane(frame.data[plane], frame.linesize[plane], width_ / 2, height_ / 2, kNoColour);
 }
 
 /// Scales after the conversion, which leaves less than half of the bytes to scale.
-void FrameConverter::scaleInto(const VideoSurface& surface, const Rectangle& target) {
+void FrameConverter::scaleInto(const AVFrame& frame, const VideoSurface& surface, const Rectangle& target) {
     const int width = static_cast<int>(surface.width());
     const int height = static_cast<int>(surface.height());
     const int halfWidth = (width + 1) / 2;
@@ -92,11 +98,11 @@ void FrameConverter::scaleInto(const VideoSurface& surface, const Rectangle& tar
     std::uint8_t* v = u + chromaSize;
     libyuv::ARGBToI420(pixels(surface), stride(surface), y, width, u, halfWidth, v, halfWidth, width, height);
     const auto place = [&](int plane, int x, int row) {
-        return frame_->data[plane] + row * frame_->linesize[plane] + x;
+        return frame.data[plane] + row * frame.linesize[plane] + x;
     };
     libyuv::I420Scale(y, width, u, halfWidth, v, halfWidth, width, height, place(0, target.x, target.y),
-                      frame_->linesize[0], place(1, target.x / 2, target.y / 2), frame_->linesize[1],
-                      place(2, target.x / 2, target.y / 2), frame_->linesize[2], target.width, target.height,
+                      frame.linesize[0], place(1, target.x / 2, target.y / 2), frame.linesize[1],
+                      place(2, target.x / 2, target.y / 2), frame.linesize[2], target.width, target.height,
                       libyuv::kFilterBox);
 }
 

@@ -10,14 +10,14 @@
 namespace kelvo {
 
 /// Turns surfaces into the frames of one encoder: BT.601, limited range, 4:2:0. A surface of another shape is
-/// scaled with its aspect kept and centred; the rest stays black. Caller's thread.
+/// scaled with its aspect kept and centred; the rest stays black. One thread at a time.
 class FrameConverter {
   public:
     FrameConverter(int width, int height) : width_(width), height_(height) {}
 
-    /// The one frame, filled with the picture of `surface`; none without memory. It is filled again by the
-    /// next call, so encoders that keep frames get copies.
-    AVFrame* convert(const VideoSurface& surface);
+    /// A frame with the picture of `surface`, which is not needed any more; none without memory. The frame's
+    /// memory is used again once the caller and its encoder have let go of it, on whatever thread.
+    FramePointer convert(const VideoSurface& surface);
 
   private:
     struct Rectangle {
@@ -28,15 +28,20 @@ class FrameConverter {
         friend bool operator==(const Rectangle&, const Rectangle&) = default;
     };
 
-    bool prepareFrame();
+    struct Canvas {
+        FramePointer frame;
+        Rectangle filled;  ///< the rest is black
+    };
+
+    Canvas* freeCanvas();
+    FramePointer makeFrame() const;
     Rectangle fit(int width, int height) const;
-    void blacken();
-    void scaleInto(const VideoSurface& surface, const Rectangle& target);
+    void blacken(const AVFrame& frame) const;
+    void scaleInto(const AVFrame& frame, const VideoSurface& surface, const Rectangle& target);
 
     const int width_;
     const int height_;
-    FramePointer frame_;
-    Rectangle filled_;
+    std::vector<Canvas> canvases_;
     std::vector<std::uint8_t> unscaled_;
 };
 

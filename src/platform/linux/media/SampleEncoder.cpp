@@ -16,7 +16,7 @@ namespace {
 class VideoSampleEncoder : public SampleEncoder {
   public:
     Result<TrackFormat> open(const Dictionary& outputSettings, SampleHandler handler) override;
-    OptionalError encode(const SampleBuffer& sample, const MovieTimeline& timeline) override;
+    Work take(const SampleBufferRef& sample, const MovieTimeline& timeline) override;
     OptionalError flush(const MovieTimeline&) override { return encoder_->flush(handler_); }
 
   private:
@@ -43,24 +43,32 @@ Result<TrackFormat> VideoSampleEncoder::open(const Dictionary& outputSettings, S
     return format;
 }
 
-OptionalError VideoSampleEncoder::encode(const SampleBuffer& sample, const MovieTimeline& timeline) {
+/// Converts at once: what waits for the encoder then takes less than half of the memory, and the surface is
+/// free for the next frame of the screen.
+SampleEncoder::Work VideoSampleEncoder::take(const SampleBufferRef& sample, const MovieTimeline& timeline) {
     const MediaTime time =
-        (sample.presentationTime() - timeline.start()).convertedTo(VideoEncoder::kTimescale);
+        (sample->presentationTime() - timeline.start()).convertedTo(VideoEncoder::kTimescale);
     // Frames closer than the file's unit fall on one time; so does a clock that stands still.
-    if (!time.isValid() || time.value <= lastTime_) return std::nullopt;
+    if (!time.isValid() || time.value <= lastTime_) return nullptr;
     lastTime_ = time.value;
-    AVFrame* frame = converter_->convert(*sample.surface());
-    if (frame == nullptr) return KVError::posix(ENOMEM, "video frame");
-    return encoder_->encode(*frame, time.value, handler_);
+    const std::shared_ptr<AVFrame> frame = converter_->convert(*sample->surface());
+    return [this, frame, time]() -> OptionalError {
+        if (!frame) return KVError::posix(ENOMEM, "video frame");
+        return encoder_->encode(*frame, time.value, handler_);
+    };
 }
 
 class AudioSampleEncoder : public SampleEncoder {
   public:
     Result<TrackFormat> open(const Dictionary& outputSettings, SampleHandler handler) override;
-    OptionalError encode(const SampleBuffer& sample, const MovieTimeline& timeline) override;
+    Work take(const SampleBufferRef& sample, const MovieTimeline& timeline) override {
+        return [this, sample, &timeline] { return encode(*sample, timeline); };
+    }
     OptionalError flush(const MovieTimeline& timeline) override;
 
   private:
+    OptionalError encode(const SampleBuffer& sample, const MovieTimeline& timeline);
+
     std::unique_ptr<AudioEncoder> encoder_;
     std::optional<AudioAligner> aligner_;
     std::optional<SoundCutter> cutter_;

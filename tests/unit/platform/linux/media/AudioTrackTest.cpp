@@ -308,6 +308,13 @@ TEST_F(AudioTrackTest, FormatsThatAreNoLinearPCMAreLoggedOnceAndDropped) {
     EXPECT_EQ(log.count("dropping audio: not a linear PCM format"), 1U);
 }
 
+TEST_F(AudioTrackTest, BuffersOfOneMomentDoNotBlockTheInput) {
+    for (int i = 0; i < 100; ++i)
+        append(testTone(movie.timeAt(0), 441));
+    appendTone(0.01, 0.5);
+    EXPECT_NEAR(static_cast<double>(finish().size()) / kRate, 0.5, 0.03);
+}
+
 TEST_F(AudioTrackTest, ShortBufferGivesWhatItHolds) {
     TimingRecord timing;
     timing.presentationTime = MediaTime::make(movie.timeAt(0), 1000000000);

@@ -3,6 +3,7 @@
 #include "platform/MediaSettings.h"
 #include "support/Eventually.h"
 
+#include <array>
 #include <cmath>
 #include <cstdlib>
 #include <filesystem>
@@ -287,15 +288,34 @@ TEST_F(LavFileWriterTest, MissingFolderFailsTheCreation) {
 TEST_F(LavFileWriterTest, InputFallsBehindAndCatchesUp) {
     TestMovie movie(service, path, {});
     ASSERT_TRUE(movie.start());
+    std::vector<SampleBufferRef> frames;
+    for (int i = 0; i < 60; ++i)
+        frames.push_back(testFrame({320, 240}, i, movie.timeAt(i / 60.0)));
     bool wasBusy = false;
-    for (int i = 0; i < 200; ++i) {
-        movie.video().append(testFrame({320, 240}, i, movie.timeAt(i / 60.0)));
+    for (const SampleBufferRef& frame : frames) {
+        movie.video().append(frame);
         wasBusy = wasBusy || !movie.video().isReadyForMoreMediaData();
     }
     EXPECT_TRUE(wasBusy);
-    EXPECT_TRUE(movie.appendWhenReady(movie.video(), testFrame({320, 240}, 200, movie.timeAt(4))));
+    EXPECT_TRUE(movie.appendWhenReady(movie.video(), testFrame({320, 240}, 60, movie.timeAt(4))));
     movie.finish();
-    EXPECT_EQ(frameTimes(path, "v:0").size(), 201U);
+    EXPECT_EQ(frameTimes(path, "v:0").size(), 61U);
+}
+
+TEST_F(LavFileWriterTest, AppendedFrameIsTheScreensAgainAtOnce) {
+    TestMovie movie(service, path, {});
+    ASSERT_TRUE(movie.start());
+    const SampleBufferRef frame = testFrame({320, 240}, 0, movie.timeAt(0));
+    const VideoSurfaceRef surface = frame->surface();
+    const auto held = surface.use_count();
+    for (int i = 0; i < 10; ++i) {
+        TimingRecord timing;
+        timing.presentationTime = MediaTime::make(movie.timeAt(i / 60.0), kSecond);
+        movie.video().append(frame->copyWithTiming(std::array{timing}));
+        EXPECT_EQ(surface.use_count(), held);
+    }
+    movie.finish();
+    EXPECT_EQ(frameTimes(path, "v:0").size(), 10U);
 }
 
 TEST_F(LavFileWriterTest, UnfinishedMoviePlaysUpToItsLastFragment) {
