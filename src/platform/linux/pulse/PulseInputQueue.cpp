@@ -8,7 +8,9 @@
 namespace kelvo::pulse {
 namespace {
 
-constexpr std::chrono::milliseconds kTickInterval{20};
+/// How often silence is looked for, of which nobody tells. A little longer than a buffer, so that buffers
+/// that are filled with sound need no other look.
+constexpr std::chrono::milliseconds kTickInterval{50};
 
 std::uint32_t rateOf(const AudioFormatRecord& format) {
     return static_cast<std::uint32_t>(format.sampleRate);
@@ -39,8 +41,10 @@ PulseInputQueue::~PulseInputQueue() = default;
 
 PulseInputQueue::Run::Run(PulseInputQueue& queue, const RecordStream::Source& format)
     : timeline(queue.clock_->monotonicNow(), format.rate, format.channels),
-      tap(queue.server_(), queue.clock_, queue.processIdentifier_, format, timeline),
-      ticker("kelvo.tap", kTickInterval, [this, &queue] { queue.fillBuffers(timeline); }) {}
+      ticker("kelvo.tap", kTickInterval, [this, &queue] { queue.fillBuffers(timeline); }),
+      tap(queue.server_(), queue.clock_, queue.processIdentifier_, format, timeline, [this, &queue] {
+          if (queue.canFillBuffer(timeline)) ticker.wake();
+      }) {}
 
 OptionalError PulseInputQueue::unlessDisposed(const char* operation) const {
     return isDisposed_ ? OptionalError(audioError(kAudioInvalidRunState, operation)) : std::nullopt;
@@ -132,6 +136,10 @@ OptionalError PulseInputQueue::removeRunningListener() {
 
 void PulseInputQueue::runningChanged() const {
     if (const auto listener = listener_.copy()) listener();
+}
+
+bool PulseInputQueue::canFillBuffer(const MixTimeline& timeline) const {
+    return timeline.readableFrames(clock_->monotonicNow()) >= framesInNextBuffer();
 }
 
 void PulseInputQueue::fillBuffers(MixTimeline& timeline) {

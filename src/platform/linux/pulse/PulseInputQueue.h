@@ -42,15 +42,16 @@ class PulseInputQueue : public AudioInputQueue {
     OptionalError removeRunningListener() override;
 
   private:
-    /// What exists while the queue runs. Members go in reverse order: the ticker before what it reads.
+    /// What exists while the queue runs. Members go in reverse order: each before what it calls or reads.
     struct Run {
         Run(PulseInputQueue& queue, const RecordStream::Source& format);
         MixTimeline timeline;
-        PulseTap tap;
         Ticker ticker;
+        PulseTap tap;
     };
 
     void endRun();
+    bool canFillBuffer(const MixTimeline& timeline) const;
     void fillBuffers(MixTimeline& timeline);
     std::int64_t framesInNextBuffer() const;
     void fill(MixTimeline& timeline, const AudioQueueBufferRef& buffer, std::int64_t frames);

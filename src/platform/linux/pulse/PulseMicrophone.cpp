@@ -7,7 +7,8 @@
 namespace kelvo::pulse {
 namespace {
 
-constexpr std::chrono::milliseconds kDeliveryInterval{20};
+/// Whatever comes wakes the ticker.
+constexpr std::chrono::seconds kLongestWait{1};
 
 }  // namespace
 
@@ -15,13 +16,13 @@ PulseMicrophone::PulseMicrophone(std::shared_ptr<PulseServer> server, std::share
                                  Handlers handlers)
     : server_(std::move(server)), clock_(std::move(clock)), handlers_(std::move(handlers)) {
     run_.reserve(BlockRing::kBlockSize * BlockRing::kBlockCount);
+    ticker_ = std::make_unique<Ticker>("kelvo.microphone", kLongestWait, [this] { deliver(); });
     server_->add(*this);
-    ticker_ = std::make_unique<Ticker>("kelvo.microphone", kDeliveryInterval, [this] { deliver(); });
 }
 
 PulseMicrophone::~PulseMicrophone() {
-    ticker_.reset();
     server_->remove(*this);
+    ticker_.reset();
 }
 
 void PulseMicrophone::serverCame(pa_context* context) {
@@ -84,11 +85,13 @@ void PulseMicrophone::streamFailed(RecordStream&) {
 void PulseMicrophone::setInterrupted(bool isInterrupted) {
     if (std::exchange(isInterrupted_, isInterrupted) == isInterrupted) return;
     blocks_.putEvent(isInterrupted ? BlockRing::Event::interrupted : BlockRing::Event::resumed);
+    ticker_->wake();
 }
 
 void PulseMicrophone::streamRecorded(RecordStream&, std::chrono::nanoseconds moment,
                                      std::span<const std::int16_t> samples) {
     blocks_.put(moment, samples, kRate);
+    ticker_->wake();
 }
 
 /// Hands on what has come since the last time, in as few pieces as its moments allow.

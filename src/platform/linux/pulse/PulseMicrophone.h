@@ -17,7 +17,7 @@ class PulseMicrophone : private PulseClient, private RecordStreamReceiver {
 
     struct Handlers {
         /// Mono sound that began at `moment` of the host's monotonic clock, on a thread of the microphone's
-        /// own, up to fifty times a second.
+        /// own, some 25 times a second.
         std::function<void(std::chrono::nanoseconds moment, std::span<const std::int16_t> samples)> recorded;
         /// The source went away or rests (true), or delivers again. On the same thread, in its place between
         /// what was recorded.

@@ -6,12 +6,14 @@
 namespace kelvo::pulse {
 
 PulseTap::PulseTap(std::shared_ptr<PulseServer> server, std::shared_ptr<Clock> clock,
-                   std::int32_t processIdentifier, RecordStream::Source format, MixTimeline& timeline)
+                   std::int32_t processIdentifier, RecordStream::Source format, MixTimeline& timeline,
+                   std::function<void()> onSound)
     : server_(std::move(server)),
       clock_(std::move(clock)),
       processIdentifier_(std::to_string(processIdentifier)),
       format_(format),
-      timeline_(timeline) {
+      timeline_(timeline),
+      onSound_(std::move(onSound)) {
     server_->add(*this);
 }
 
@@ -84,7 +86,9 @@ PulseTap::Attachments::iterator PulseTap::attachmentOf(const RecordStream& strea
 void PulseTap::streamRecorded(RecordStream& stream, std::chrono::nanoseconds moment,
                               std::span<const std::int16_t> samples) {
     const auto found = attachmentOf(stream);
-    if (found != attachments_.end()) timeline_.write(found->second.index, moment, samples);
+    if (found == attachments_.end()) return;
+    timeline_.write(found->second.index, moment, samples);
+    onSound_();
 }
 
 void PulseTap::streamResumed(RecordStream&) {}

@@ -3,6 +3,7 @@
 #include "platform/linux/pulse/MixTimeline.h"
 #include "platform/linux/pulse/RecordStream.h"
 
+#include <functional>
 #include <map>
 #include <memory>
 
@@ -10,11 +11,13 @@ namespace kelvo::pulse {
 
 /// Mixes everything that one process plays onto a time line, from construction until destruction: it attaches
 /// to each of the process's sink inputs, as they come, move to other sinks and go. What a stream says of its
-/// process is its client's word. Must not be destroyed on the sound server's thread.
+/// process is its client's word. Calls `onSound`, on the sound server's thread, after it has mixed something.
+/// Must not be destroyed on that thread.
 class PulseTap : private PulseClient, private RecordStreamReceiver {
   public:
     PulseTap(std::shared_ptr<PulseServer> server, std::shared_ptr<Clock> clock,
-             std::int32_t processIdentifier, RecordStream::Source format, MixTimeline& timeline);
+             std::int32_t processIdentifier, RecordStream::Source format, MixTimeline& timeline,
+             std::function<void()> onSound);
     ~PulseTap() override;
     PulseTap(const PulseTap&) = delete;
     PulseTap& operator=(const PulseTap&) = delete;
@@ -48,6 +51,7 @@ class PulseTap : private PulseClient, private RecordStreamReceiver {
     const std::string processIdentifier_;
     const RecordStream::Source format_;
     MixTimeline& timeline_;
+    const std::function<void()> onSound_;
 
     /// Under the loop's lock.
     pa_context* context_ = nullptr;

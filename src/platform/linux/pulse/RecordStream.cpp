@@ -5,8 +5,9 @@
 namespace kelvo::pulse {
 namespace {
 
-/// How much sound the server collects before it sends it.
-constexpr pa_usec_t kFragment = 20 * PA_USEC_PER_MSEC;
+/// How much sound the server collects before it sends it, and with that how late sound comes: each fragment
+/// wakes a row of threads.
+constexpr pa_usec_t kFragment = 40 * PA_USEC_PER_MSEC;
 
 RecordStream* streamOf(void* data) {
     return static_cast<RecordStream*>(data);

@@ -3,6 +3,7 @@
 
 #include <atomic>
 #include <future>
+#include <semaphore>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -80,6 +81,15 @@ TEST(TickerTest, TicksUntilItGoes) {
         ASSERT_EQ(third.get_future().wait_for(10s), std::future_status::ready);
     }
     EXPECT_GE(ticks, 3);
+}
+
+TEST(TickerTest, WokenTickerDoesNotWaitForItsInterval) {
+    std::binary_semaphore ticked{0};
+    Ticker ticker("test.ticker", 1h, [&] { ticked.release(); });
+    for (int i = 0; i < 3; ++i) {
+        ticker.wake();
+        ASSERT_TRUE(ticked.try_acquire_for(30s));
+    }
 }
 
 }  // namespace
