@@ -40,6 +40,10 @@ OptionalError writeWithinBounds(const Array& values, dbus::Message& message) {
     return KVError::posix(EMSGSIZE, "arguments of " + message.member);
 }
 
+KVError notConnected() {
+    return KVError::posix(ENOTCONN, "connection");
+}
+
 }  // namespace
 
 void SocketConnection::handle(dbus::Message message) {
@@ -183,10 +187,9 @@ OptionalError SocketConnection::transmit(std::size_t method, const IPCMethod& de
 
 OptionalError SocketConnection::sendCall(dbus::Message message, ReplyIdentifier identifier,
                                          std::size_t method, LentSurfaces surfaces, ErrorReport whenUnsent) {
-    const KVError notConnected = KVError::posix(ENOTCONN, "connection");
     std::unique_lock lock(outMutex_);
     // Looked at under the lock: what is queued or lent afterwards would not be found by `close`.
-    if (isOver() || cannotSend_) return notConnected;
+    if (isOver() || cannotSend_) return notConnected();
     message.serial = nextSerial();
     if (!surfaces.empty()) {
         if (out_.lent.size() >= ipc_bounds::kMostLentMessages) return KVError::posix(EAGAIN, "surface");
@@ -198,7 +201,7 @@ OptionalError SocketConnection::sendCall(dbus::Message message, ReplyIdentifier 
     afterPush(isWithinBounds);
     // What was queued without wanting a reply is reported from the queue, should it stay there.
     const bool isReportedHere = identifier != 0 ? isOver() || cannotSend_ : !isWithinBounds;
-    return isReportedHere ? OptionalError(notConnected) : std::nullopt;
+    return isReportedHere ? OptionalError(notConnected()) : std::nullopt;
 }
 
 void SocketConnection::sendMessage(dbus::Message message) {
