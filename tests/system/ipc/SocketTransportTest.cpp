@@ -128,6 +128,21 @@ TEST_F(SocketTransportTest, ConnectingWhereNobodyListensFails) {
     EXPECT_FALSE(transport->connectToEndpoint(nullptr));
 }
 
+TEST_F(SocketTransportTest, ConnectingToOneThatTakesNobodyFailsInTheEnd) {
+    const std::string place = root.path() + "/asleep";
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    place.copy(address.sun_path, sizeof(address.sun_path) - 1);
+    const UniqueFd asleep(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    ASSERT_EQ(::bind(asleep.get(), reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
+    ASSERT_EQ(::listen(asleep.get(), 0), 0);
+    const auto waiting = transport->connectToSocket(place);
+    ASSERT_TRUE(waiting);
+    const auto refused = transport->connectToSocket(place);
+    ASSERT_FALSE(refused);
+    EXPECT_EQ(refused.error().code(), ETIMEDOUT);
+}
+
 TEST_F(SocketTransportTest, TwoHundredClientsAreServedAtOnce) {
     constexpr int kClients = 200;
     // Of several processes, as one process may not hold that many.

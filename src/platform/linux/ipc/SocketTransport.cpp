@@ -9,6 +9,20 @@
 #include <sys/un.h>
 
 namespace kelvo {
+namespace {
+
+/// How long a listener that takes nobody, with as many waiting as it lets wait, is given.
+constexpr timeval kConnectPatience{2, 0};
+
+OptionalError connectTo(const sockaddr_un& address, int socket, const std::string& path) {
+    // Sends of a connection never wait, so this is for the connecting alone.
+    ::setsockopt(socket, SOL_SOCKET, SO_SNDTIMEO, &kConnectPatience, sizeof(kConnectPatience));
+    if (::connect(socket, reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0)
+        return std::nullopt;
+    return KVError::posix(errno == EAGAIN ? ETIMEDOUT : errno, path);
+}
+
+}  // namespace
 
 std::string SocketTransport::pathOf(std::string_view serviceName) const {
     return root_->hostPath("/run/kelvod/" + std::string(serviceName));
@@ -32,8 +46,8 @@ Result<IPCConnectionRef> SocketTransport::connectToSocket(const std::string& hos
     if (hostPath.size() >= sizeof(address.sun_path)) return KVError::posix(ENAMETOOLONG, hostPath);
     hostPath.copy(address.sun_path, sizeof(address.sun_path) - 1);
     UniqueFd socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-    if (!socket || ::connect(socket.get(), reinterpret_cast<sockaddr*>(&address), sizeof(address)) != 0)
-        return KVError::posix(errno, hostPath);
+    if (!socket) return KVError::posix(errno, hostPath);
+    if (const OptionalError error = connectTo(address, socket.get(), hostPath)) return *error;
     return IPCConnectionRef(std::make_shared<SocketConnection>(
         SocketConnection::Side::client, std::move(socket), loop_, bundles_, root_, nullptr));
 }

@@ -31,7 +31,8 @@ class SocketTransport : public IPCTransport {
     Result<IPCConnectionRef> connectToEndpoint(const std::shared_ptr<IPCEndpoint>& endpoint) override;
     IPCConnectionRef currentConnection() override;
 
-    /// As `connectToService`, by the socket's path on the host.
+    /// As `connectToService`, by the socket's path on the host. Gives up after two seconds when the daemon
+    /// takes nobody and as many wait there as may.
     Result<IPCConnectionRef> connectToSocket(const std::string& hostPath);
 
   private:
