@@ -1,92 +1,16 @@
-#include "ManagerFixture.h"
+#include "ManagerStartFixture.h"
 
-#include <map>
 #include <thread>
 
 namespace kelvo {
 namespace {
 
+using test::Answer;
+using test::kUpdate;
 using testing::ElementsAre;
 using testing::IsEmpty;
 
-constexpr const char* kUpdate = "updateScreenRecordingState";
-
-struct Answer {
-    std::int64_t code;
-    bool microphone;
-    bool camera;
-    friend bool operator==(const Answer&, const Answer&) = default;
-};
-
-/// Starts by the application "com.example.app", process 10, and by the system's shell, process 11.
-class ManagerStartTest : public test::ManagerFixture {
-  protected:
-    ManagerStartTest() {
-        createManager();
-        addApplication(10, "com.example.app", Dictionary());
-        addApplication(11, "com.quillon.plinth", {{"com.quillon.private.kelvo-kit", true}});
-        device.applications->change({kApplicationStateForeground, 10, true, "com.example.app"});
-        device.renderServer->setProcessOfContext(7, 10);
-        device.renderServer->setProcessOfContext(8, 11);
-        device.setLayout({1});
-        application = session("com.example.app");
-        application->client->process = 10;
-        system = session("com.quillon.plinth");
-        callFrom(10);
-    }
-
-    void addApplication(std::int32_t process, const std::string& bundle, const Dictionary& entitlements) {
-        SimulatedBundleContent content;
-        content.bundleIdentifier = bundle;
-        device.bundles->addBundle("/Applications/" + bundle, content);
-        device.bundles->addProcess(process, "/Applications/" + bundle + "/program");
-        connections[process] = std::make_shared<SimulatedConnection>(process, entitlements);
-    }
-    void callFrom(std::int32_t process) { device.ipc->setCurrentConnection(connections[process]); }
-
-    KVDaemonProtocol::StartHandler handler() {
-        return [this](const OptionalError& error, bool withMicrophone, bool withCamera) {
-            lastError = error;
-            answers.push_back({error ? error->code() : 0, withMicrophone, withCamera});
-        };
-    }
-    void request(bool systemRecording, const KVDaemonProtocol::StartHandler& answered) {
-        manager->startRecordingWindowLayerContextIDs(contexts, {108, 192}, microphone, camera, broadcast,
-                                                     systemRecording, capture, endpoint, answered);
-    }
-    void startInApp() { request(false, handler()); }
-    /// On the main queue, where the status bar lives.
-    void startSystem(const KVDaemonProtocol::StartHandler& answered) {
-        callFrom(11);
-        device.mainQueue->async([&] { request(true, answered); });
-        device.settle();
-    }
-    void startSystem() { startSystem(handler()); }
-    void accept() { device.answerAlert(SystemAlertResponse::alternateButton); }
-
-    /// The client was refused with `code`, saw (or did not see) its state change, and nothing was started.
-    void expectRefusal(const test::FakeRecordingSession& session, std::int64_t code, bool isUpdated) {
-        EXPECT_THAT(answers, ElementsAre(Answer{code, false, false}));
-        EXPECT_EQ(session.client->messages().size(), isUpdated ? 1U : 0U);
-        if (isUpdated) {
-            EXPECT_EQ(session.client->messages().front(), kUpdate);
-        }
-        EXPECT_FALSE(session.recording);
-        EXPECT_EQ(session.start, nullptr);
-    }
-
-    std::map<std::int32_t, IPCConnectionRef> connections;
-    std::shared_ptr<test::FakeRecordingSession> application;
-    std::shared_ptr<test::FakeRecordingSession> system;
-    std::vector<std::uint32_t> contexts{7};
-    bool microphone = true;
-    bool camera = false;
-    bool broadcast = false;
-    bool capture = false;
-    std::shared_ptr<IPCEndpoint> endpoint;
-    std::vector<Answer> answers;
-    OptionalError lastError;
-};
+using ManagerStartTest = test::ManagerStartFixture;
 
 TEST_F(ManagerStartTest, InAppRecordingIsConfiguredInOrderAndStarted) {
     accept();
@@ -187,43 +111,6 @@ TEST_F(ManagerStartTest, PreferenceOfTheStatusBarIsLookedAtForApplicationsToo) {
     EXPECT_EQ(manager->statusBarAssertion()->processIdentifier(), 0) << "an application shows none";
 }
 
-TEST_F(ManagerStartTest, ActiveInCarDisplayRefuses) {
-    device.inCarDisplay->setActive(true);
-    startInApp();
-    expectRefusal(*application, -5813, true);
-}
-
-TEST_F(ManagerStartTest, UnknownInCarDisplayRefusesNothing) {
-    device.inCarDisplay->setActive(true);
-    device.failNext("InCarDisplay.isActive", EIO);
-    accept();
-    startInApp();
-    EXPECT_TRUE(application->recording);
-}
-
-TEST_F(ManagerStartTest, SystemRecordingNeedsTheEntitlement) {
-    callFrom(10);
-    request(true, handler());
-    expectRefusal(*application, -5810, true);
-}
-
-TEST_F(ManagerStartTest, ForeignOrUnknownWindowsAreRefused) {
-    for (const std::uint32_t foreign : {8U, 9U}) {
-        answers.clear();
-        contexts = {7, foreign};
-        startInApp();
-        expectRefusal(*application, -5803, false);
-    }
-    EXPECT_FALSE(log.contains("KVRecordingManager:stopCurrentRecordingSession:"));
-}
-
-TEST_F(ManagerStartTest, NoWindowsAtAllPass) {
-    contexts = {};
-    accept();
-    startInApp();
-    EXPECT_TRUE(application->recording);
-}
-
 TEST_F(ManagerStartTest, RepeatedStartOfTheSystemRecordingEndsTheFirstBeforeTheSecond) {
     system->recording = true;
     system->systemRecording = true;
@@ -256,56 +143,6 @@ TEST_F(ManagerStartTest, RepeatedStartOfAnApplicationThrowsTheFirstRecordingAway
     EXPECT_EQ(device.alerts->shownAlerts().size(), 1U) << "exempt by now";
 }
 
-TEST_F(ManagerStartTest, FreeSpaceMustBeAboveTheBound) {
-    device.setFreeSpace(100000000);
-    startInApp();
-    expectRefusal(*application, -5805, true);
-    EXPECT_TRUE(log.contains("insufficient disk space for recording, calling handler with error"));
-    device.setFreeSpace(100000001);
-    accept();
-    startInApp();
-    EXPECT_TRUE(application->recording);
-}
-
-TEST_F(ManagerStartTest, ApplicationInTheBackgroundIsRefused) {
-    device.applications->change({kApplicationStateForegroundObscured, 10, true, "com.example.app"});
-    startInApp();
-    expectRefusal(*application, -5803, false);
-    EXPECT_TRUE(log.contains("app is not in the foreground, calling handler with error"));
-}
-
-TEST_F(ManagerStartTest, CallerWithoutASessionIsRefused) {
-    addApplication(12, "com.example.other", {{"com.quillon.private.kelvo-kit", true}});
-    callFrom(12);
-    request(true, handler());
-    EXPECT_THAT(answers, ElementsAre(Answer{-5803, false, false}));
-}
-
-TEST_F(ManagerStartTest, LockedDeviceRefusesWhoeverWantsAnAnswer) {
-    manager->setDeviceLocked(true);
-    startSystem();
-    expectRefusal(*system, -5809, true);
-    EXPECT_TRUE(log.contains("failed to start system recording because device was in locked state"));
-    startSystem(nullptr);
-    EXPECT_TRUE(system->recording);
-}
-
-TEST_F(ManagerStartTest, LockedDeviceDoesNotConcernApplications) {
-    manager->setDeviceLocked(true);
-    accept();
-    startInApp();
-    EXPECT_TRUE(application->recording);
-}
-
-TEST_F(ManagerStartTest, DecliningUserRefuses) {
-    device.answerAlert(SystemAlertResponse::defaultButton);
-    startInApp();
-    expectRefusal(*application, -5801, false);
-    EXPECT_TRUE(log.contains("user declined"));
-    EXPECT_FALSE(log.contains("starting..."));
-    EXPECT_TRUE(manager->isMicrophoneRecording()) << "what was asked for stays";
-}
-
 TEST_F(ManagerStartTest, MicrophoneThatTheUserRefusesIsNotRecorded) {
     device.answerAlert(SystemAlertResponse::otherButton);
     startInApp();
@@ -334,18 +171,6 @@ TEST_F(ManagerStartTest, InternalBuildWithoutThePreferenceAsks) {
     EXPECT_TRUE(log.contains("KVRecordingManager: suppressAlert=0"));
 }
 
-TEST_F(ManagerStartTest, SplitScreenRefusesAfterTheUserWasAsked) {
-    device.setLayout({0, 1});
-    accept();
-    startInApp();
-    expectRefusal(*application, -5807, false);
-    EXPECT_EQ(device.alerts->shownAlerts().size(), 1U);
-    EXPECT_TRUE(log.contains("attempted to start recording in split mode, bailing out"));
-    startSystem();
-    EXPECT_TRUE(system->recording) << "the whole screen may be split";
-    EXPECT_EQ(manager->levelOneElementCount(), 2);
-}
-
 TEST_F(ManagerStartTest, LayoutIsWatchedFromTheFirstStartOnce) {
     accept();
     startInApp();
@@ -369,15 +194,6 @@ TEST_F(ManagerStartTest, LayoutIsNotWatchedAgainAfterAStop) {
     EXPECT_EQ(device.displayLayout->monitorCount(), 1);
 }
 
-TEST_F(ManagerStartTest, BroadcastWithoutASetUpIsRefusedWithoutAText) {
-    broadcast = true;
-    accept();
-    startInApp();
-    expectRefusal(*application, -5808, true);
-    EXPECT_EQ(lastError, KVError(std::string(KVRecordingErrorDomain), -5808));
-    EXPECT_TRUE(log.contains("attempted to start broadcast without a session, bailing out"));
-}
-
 TEST_F(ManagerStartTest, BroadcastIsEnabledWithWhatTheSetUpFound) {
     broadcast = true;
     const auto configuration = std::make_shared<KVBroadcastConfiguration>();
@@ -397,17 +213,6 @@ TEST_F(ManagerStartTest, BroadcastIsEnabledWithWhatTheSetUpFound) {
     EXPECT_EQ(application->listenerEndpoint, endpoint);
     EXPECT_TRUE(log.contains("broadcast requested"));
     EXPECT_TRUE(log.contains("found broadcast info, enabling for session"));
-}
-
-TEST_F(ManagerStartTest, BroadcastThatCannotBeEnabledRefusesWhoeverWantsAnAnswer) {
-    broadcast = true;
-    application->extension = Dictionary();
-    application->broadcastError = KVError("domain", 5);
-    accept();
-    startInApp();
-    expectRefusal(*application, 5, true);
-    request(false, nullptr);
-    EXPECT_TRUE(application->recording);
 }
 
 TEST_F(ManagerStartTest, OtherRecordingsAreInterrupted) {
