@@ -50,7 +50,9 @@ FrameConverter::Canvas* FrameConverter::freeCanvas() {
     const auto free = std::ranges::find_if(canvases_, isFree);
     if (free != canvases_.end()) return &*free;
     FramePointer frame = makeFrame();
-    return frame ? &canvases_.emplace_back(std::move(frame), Rectangle{}) : nullptr;
+    if (!frame) return nullptr;
+    canvases_.push_back({std::move(frame), {}});
+    return &canvases_.back();
 }
 
 FramePointer FrameConverter::makeFrame() const {

@@ -289,6 +289,7 @@ TEST_F(LavFileWriterTest, InputFallsBehindAndCatchesUp) {
     TestMovie movie(service, path, {});
     ASSERT_TRUE(movie.start());
     std::vector<SampleBufferRef> frames;
+    frames.reserve(60);
     for (int i = 0; i < 60; ++i)
         frames.push_back(testFrame({320, 240}, i, movie.timeAt(i / 60.0)));
     bool wasBusy = false;
