@@ -100,9 +100,8 @@ const char* Options::helpText() {
            "  --version          print the version and exit\n"
            "  --help             print this and exit\n"
            "\n"
-           "SIGTERM and SIGINT end the daemon. The exit status is 0 then, 1 when it cannot start, 2 for a "
-           "wrong\n"
-           "command line.\n";
+           "SIGTERM, SIGINT and SIGHUP end the daemon. The exit status is 0 then, 1 when it cannot start,\n"
+           "2 for a wrong command line.\n";
 }
 
 }  // namespace kelvo

@@ -23,6 +23,15 @@ TEST_F(KelvoctlRecordingTest, CtrlCStopsAndSaves) {
     EXPECT_EQ(daemon->arguments()[2], Array{*daemon->movie.copy()});
 }
 
+TEST_F(KelvoctlRecordingTest, TerminalThatIsClosedStopsAndSaves) {
+    KelvoctlProcess record(socket, {"record"});
+    ASSERT_TRUE(record.waitForLine("recording; Ctrl-C")) << record.output();
+    record.signal(SIGHUP);
+    EXPECT_EQ(record.waitForExit(), 0);
+    EXPECT_THAT(daemon->requests(), ElementsAre("startRecordingWindowLayerContextIDs",
+                                                "stopRecordingWithHandler", "saveVideoToCameraRoll"));
+}
+
 TEST_F(KelvoctlRecordingTest, WholeScreenIsAskedForInTheSizeAndWithTheMicrophoneOfTheLine) {
     EXPECT_EQ(
         KelvoctlProcess::run(socket, {"record", "--size=800x600", "--microphone", "--seconds=0.05"}).first,
