@@ -121,6 +121,7 @@ class Recording {
             if (error == nullptr) return stoppedElsewhere();
             hideTimer();
             program_.fail(*error);
+            program_.remark("`kelvoctl library` tells what was saved, `library recover` saves what was not");
         }
         if (name != "updateScreenRecordingState") return;
         program_.daemon().synchronousGetCurrentState(program_.onMain([this](const auto& state) {

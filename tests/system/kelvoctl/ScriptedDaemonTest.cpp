@@ -116,7 +116,9 @@ TEST_F(KelvoctlRecordingTest, RecordingThatTheSystemEndsIsToldWithItsReason) {
     ASSERT_TRUE(record.waitForLine("recording;"));
     client().recordingDidStopWithError(errorSaying("a call came"), std::nullopt);
     EXPECT_EQ(record.waitForExit(), 1);
-    EXPECT_NE(record.output().find("kelvoctl: a call came (domain -5804)"), std::string::npos);
+    EXPECT_NE(record.output().find("kelvoctl: a call came (domain -5804)\n`kelvoctl library` tells"),
+              std::string::npos)
+        << record.output();
 }
 
 TEST_F(KelvoctlRecordingTest, RecordingThatTheDeviceLockEndsIsToldWithItsReason) {
