@@ -29,6 +29,7 @@ class FlashingWindow {
         window_ = XCreateSimpleWindow(display_, DefaultRootWindow(display_), 0, 0, kWidth, kHeight, 0, 0, 0);
         XMapWindow(display_, window_);
         XSync(display_, False);
+        std::this_thread::sleep_for(std::chrono::seconds(1));  // until the window manager has put it in front
         return true;
     }
     std::uint32_t identifier() const { return static_cast<std::uint32_t>(window_); }

@@ -13,6 +13,7 @@ int main() {
         XCreateSimpleWindow(display, DefaultRootWindow(display), 0, 0, 540, 960, 0, 0, 0xff8800);
     XMapWindow(display, window);
     XSync(display, False);
+    std::this_thread::sleep_for(std::chrono::seconds(1));  // until the window manager has put it in front
 
     kelvokit::Recorder recorder;
     std::promise<std::string> outcome;
@@ -23,7 +24,6 @@ int main() {
             outcome.set_value(failure ? failure->description : movie.value_or("no movie"));
         });
     });
-    const std::string said = outcome.get_future().get();
+    std::puts(outcome.get_future().get().c_str());
     XCloseDisplay(display);
-    return std::puts(said.c_str()) < 0;
 }

@@ -3,6 +3,7 @@
 #include "base/Guarded.h"
 
 #include <array>
+#include <atomic>
 #include <cstdarg>
 #include <cstdio>
 
@@ -10,6 +11,8 @@ namespace kelvo {
 namespace {
 
 constexpr std::size_t kLongestLine = 4096;
+
+std::atomic<bool> areSamplesLogged{true};
 
 Guarded<std::shared_ptr<LogSink>>& currentSink() {
     static Guarded<std::shared_ptr<LogSink>> sink;
@@ -36,10 +39,22 @@ std::shared_ptr<LogSink> setLogSink(std::shared_ptr<LogSink> sink) {
     return currentSink().exchange(std::move(sink));
 }
 
+void setLogsSamples(bool logsSamples) {
+    areSamplesLogged = logsSamples;
+}
+
 void KVLog(const char* format, ...) {
     std::va_list arguments;
     va_start(arguments, format);
     logLine(LogLevel::info, format, arguments);
+    va_end(arguments);
+}
+
+void KVLogSample(const char* format, ...) {
+    if (!areSamplesLogged) return;
+    std::va_list arguments;
+    va_start(arguments, format);
+    logLine(LogLevel::sample, format, arguments);
     va_end(arguments);
 }
 

@@ -56,7 +56,7 @@ void KVRecordingManager::broadcastSessionDidUpdateServiceInfo(const SessionRef& 
 }
 
 void KVRecordingManager::broadcastSessionDidUpdateDuration(const SessionRef& session, double seconds) {
-    KVLog("KVRecordingManager:broadcastSessionDidUpdateDuration:");
+    KVLogSample("KVRecordingManager:broadcastSessionDidUpdateDuration:");
     statusBarAssertion_->setMicrophoneEnabled(session->microphoneEnabled());
     statusBarAssertion_->updateDoubleHeightStatusBarWithDuration(seconds, session->isPaused());
 }

@@ -20,6 +20,7 @@ class OptionReader {
         while (!rest_.empty()) {
             if (const OptionalError error = readOne()) return *error;
         }
+        options_.logsSamples = !leavesSamplesOut_;
         return options_;
     }
 
@@ -35,6 +36,7 @@ class OptionReader {
         if (name_ == "--root") return readText(options_.root);
         if (name_ == "--resources") return readText(options_.resourceFolder);
         if (name_ == "--log") return readLog();
+        if (name_ == "--no-sample-log") return readFlag(leavesSamplesOut_);
         if (name_ == "--user-videos") return readFlag(options_.savesToUsersVideos);
         if (argument.starts_with("-")) return wrong("unknown option " + name_);
         return wrong("unexpected argument " + std::string(argument));
@@ -76,6 +78,7 @@ class OptionReader {
 
     std::span<const char* const> rest_;
     Options options_;
+    bool leavesSamplesOut_ = false;
     std::string name_;
     std::optional<std::string> inlineValue_;
 };
@@ -87,7 +90,8 @@ Result<Options> Options::parse(std::span<const char* const> arguments) {
 }
 
 const char* Options::helpText() {
-    return "Usage: kelvod [--root DIR] [--user-videos] [--log journal|stderr] [--resources DIR]\n"
+    return "Usage: kelvod [--root DIR] [--user-videos] [--log journal|stderr] [--no-sample-log] [--resources "
+           "DIR]\n"
            "\n"
            "Records the screen for the applications and the shell of this device.\n"
            "\n"
@@ -96,13 +100,15 @@ const char* Options::helpText() {
            "not\n"
            "                     to the one under DIR\n"
            "  --log SINK         log to the journal (the default) or to standard error\n"
+           "  --no-sample-log    leave out what becomes of each picture and piece of sound, over 300 lines "
+           "a\n"
+           "                     second while a recording runs\n"
            "  --resources DIR    the folder with KelvoKit.framework, if not the installed one\n"
            "  --version          print the version and exit\n"
            "  --help             print this and exit\n"
            "\n"
-           "SIGTERM and SIGINT end the daemon. The exit status is 0 then, 1 when it cannot start, 2 for a "
-           "wrong\n"
-           "command line.\n";
+           "SIGTERM, SIGINT and SIGHUP end the daemon. The exit status is 0 then, 1 when it cannot start,\n"
+           "2 for a wrong command line.\n";
 }
 
 }  // namespace kelvo

@@ -17,6 +17,7 @@ struct Options {
     std::string root = "/";
     std::string resourceFolder;  ///< empty: the installed one
     bool savesToUsersVideos = false;
+    bool logsSamples = true;
 
     /// Reads the arguments behind the program's name. The error's description says which one is wrong and
     /// how.

@@ -46,6 +46,7 @@ int run(const Options& options) {
     ::umask(S_IRWXG | S_IRWXO);  // recordings are their owner's alone
     if (options.log == Options::Log::standardError) setLogSink(std::make_shared<StderrLog>());
     if (options.log == Options::Log::journal) setLogSink(std::make_shared<JournalLog>());
+    setLogsSamples(options.logsSamples);
     raiseDescriptorLimit();
     const auto root = std::make_shared<const DeviceRoot>(
         options.root, options.resourceFolder.empty() ? installedResourceFolder() : options.resourceFolder);

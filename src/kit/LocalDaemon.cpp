@@ -4,11 +4,11 @@
 #include "platform/linux/bundles/LinuxBundleService.h"
 #include "platform/linux/bundles/LocaleLanguages.h"
 #include "platform/linux/ipc/SocketTransport.h"
+#include "platform/linux/ipc/UsualSocket.h"
 #include "support/KVLocalization.h"
 
 #include <array>
 #include <condition_variable>
-#include <cstdlib>
 #include <dlfcn.h>
 #include <filesystem>
 #include <mutex>
@@ -17,8 +17,6 @@ namespace kelvokit {
 namespace {
 
 namespace fs = std::filesystem;
-
-constexpr const char* kUsualSocket = "/run/kelvod/com.quillon.kelvod";
 
 /// The resources near this library: beside it in a build tree, in "share/kelvod" where it is installed.
 std::string resourceFolder() {
@@ -96,10 +94,7 @@ Executor ownQueue() {
 }  // namespace
 
 std::string socketPath(const RecorderOptions& options) {
-    if (!options.socketPath.empty()) return options.socketPath;
-    const char* const named =
-        std::getenv("KELVO_SOCKET");  // NOLINT(concurrency-mt-unsafe): nothing here sets it
-    return named != nullptr && *named != '\0' ? named : kUsualSocket;
+    return options.socketPath.empty() ? kelvo::usualDaemonSocket() : options.socketPath;
 }
 
 RecorderEnvironment localEnvironment(const RecorderOptions& options) {

@@ -10,7 +10,7 @@ namespace kelvokit {
 /// own, and error texts in the user's language from the installed resources.
 RecorderEnvironment localEnvironment(const RecorderOptions& options);
 
-/// The socket that the options and the environment's KELVO_SOCKET name, in this order, or the usual one.
+/// The socket that the options name, else the one where a program of this user finds the daemon.
 std::string socketPath(const RecorderOptions& options);
 
 }  // namespace kelvokit

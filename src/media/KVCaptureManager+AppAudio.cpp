@@ -175,7 +175,7 @@ void KVCaptureManager::handleInputBuffer(const TapRef& tap, const FilledBuffer& 
     }
     tap->currentPacket += packets;
     if (!tap->queue->enqueueBuffer(filled.buffer)) {
-        KVLog("KVRecordingManager: HandleInputBuffer: Successfully enqueued the audio buffer");
+        KVLogSample("KVRecordingManager: HandleInputBuffer: Successfully enqueued the audio buffer");
     }
 }
 

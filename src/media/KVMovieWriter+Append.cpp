@@ -75,7 +75,7 @@ void KVMovieWriter::drainVideo() {
             KVLog("discarding video sample buffer due to timestamp earlier than previous");
             return;
         }
-        KVLog("appending video sample");
+        KVLogSample("appending video sample");
         video_.append(*input, sample);
     }
 }
@@ -119,9 +119,9 @@ void KVMovieWriter::appendAudio(Track& track, int number, const SampleBufferRef&
             KVLog("discarding audio %d sample buffer due to timestamp earlier than previous", number);
             return;
         }
-        KVLog("appending audio %d sample with timestamp:%lld duration:%lld", number,
-              static_cast<long long>(next->presentationTime().value),
-              static_cast<long long>(next->duration().value));
+        KVLogSample("appending audio %d sample with timestamp:%lld duration:%lld", number,
+                    static_cast<long long>(next->presentationTime().value),
+                    static_cast<long long>(next->duration().value));
         track.append(*input, next);
     }
 }

@@ -12,7 +12,7 @@ void KVRecordingSession::screenCaptureControllerDidReceiveSampleBuffer(ScreenCap
                                                                        const ScreenTransform& flags) {
     if (!sample) return;
     const VideoSurface& surface = *sample->surface();
-    KVLog("Screen sampled at w:%zu h:%zu", std::size_t{surface.width()}, std::size_t{surface.height()});
+    KVLogSample("Screen sampled at w:%zu h:%zu", std::size_t{surface.width()}, std::size_t{surface.height()});
     beginTimeline(sample->presentationTime());
     updateDuartionWithSample(*sample);
     if (broadcastExtension()) {
@@ -38,7 +38,7 @@ void KVRecordingSession::_processSampleBufferForStreaming(const SampleBufferRef&
 }
 
 void KVRecordingSession::_processSampleBuffer(const SampleBufferRef& sample, const ScreenTransform& flags) {
-    KVLog("KVRecordingSession:screenCaptureController:didReceiveSampleBuffer:transformFlags:");
+    KVLogSample("KVRecordingSession:screenCaptureController:didReceiveSampleBuffer:transformFlags:");
     if (!shouldStopLock_.lockUnlessLeftTaken()) return;
     if (shouldStop_) {
         shouldStopLock_.unlock();

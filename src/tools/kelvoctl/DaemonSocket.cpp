@@ -1,30 +1,11 @@
 #include "tools/kelvoctl/DaemonSocket.h"
 
-#include <cstdlib>
-#include <filesystem>
+#include "platform/linux/ipc/UsualSocket.h"
 
 namespace kelvo::ctl {
-namespace {
-
-constexpr const char* kSocketInRuntimeFolder = "/kelvod/com.quillon.kelvod";
-
-/// Read before any thread could change the environment.
-std::string environment(const char* name) {
-    const char* const value = std::getenv(name);  // NOLINT(concurrency-mt-unsafe)
-    return value != nullptr ? value : "";
-}
-
-}  // namespace
 
 std::string daemonSocket(const std::string& given) {
-    if (!given.empty()) return given;
-    if (std::string path = environment("KELVO_SOCKET"); !path.empty()) return path;
-    if (const std::string folder = environment("XDG_RUNTIME_DIR"); !folder.empty()) {
-        std::string path = folder + kSocketInRuntimeFolder;
-        std::error_code ignored;
-        if (std::filesystem::exists(path, ignored)) return path;
-    }
-    return std::string("/run") + kSocketInRuntimeFolder;
+    return given.empty() ? usualDaemonSocket() : given;
 }
 
 std::string alertSocket(const std::string& given) {

@@ -23,7 +23,9 @@ void tellKept(Program& program, const std::string& where, Dictionary json, std::
     program.finish(kDone);
 }
 
+/// Mixing takes more than half of the time that was recorded.
 void save(Program& program, const URL& movie, std::optional<double> seconds) {
+    program.remark("saving; this takes a while after a long recording");
     program.daemon().saveVideoToCameraRoll(
         movie, program.onMain([&program, seconds](const OptionalError& error) {
             if (error) return program.fail(*error);

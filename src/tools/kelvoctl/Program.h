@@ -42,8 +42,8 @@ class Program {
     MainQueue& mainQueue() { return mainQueue_; }
     const SystemClock& clock() const { return clock_; }
 
-    /// What runs when the daemon tells something, and on the first Ctrl-C or SIGTERM. Without a handler the
-    /// latter ends the program, with success.
+    /// What runs when the daemon tells something, and on the first Ctrl-C, SIGTERM or SIGHUP. Without a
+    /// handler the latter ends the program, with success.
     void setCallbackHandler(Callbacks::Handler handler) { callbackHandler_ = std::move(handler); }
     void setInterruptHandler(Task handler) { interruptHandler_ = std::move(handler); }
 

@@ -121,6 +121,9 @@ class Recording {
             if (error == nullptr) return stoppedElsewhere();
             hideTimer();
             program_.fail(*error);
+            program_.remark(
+                "`kelvoctl library` tells what was saved; once the daemon starts anew, `library recover` "
+                "saves the rest");
         }
         if (name != "updateScreenRecordingState") return;
         program_.daemon().synchronousGetCurrentState(program_.onMain([this](const auto& state) {

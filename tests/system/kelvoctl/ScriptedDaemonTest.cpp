@@ -23,6 +23,15 @@ TEST_F(KelvoctlRecordingTest, CtrlCStopsAndSaves) {
     EXPECT_EQ(daemon->arguments()[2], Array{*daemon->movie.copy()});
 }
 
+TEST_F(KelvoctlRecordingTest, TerminalThatIsClosedStopsAndSaves) {
+    KelvoctlProcess record(socket, {"record"});
+    ASSERT_TRUE(record.waitForLine("recording; Ctrl-C")) << record.output();
+    record.signal(SIGHUP);
+    EXPECT_EQ(record.waitForExit(), 0);
+    EXPECT_THAT(daemon->requests(), ElementsAre("startRecordingWindowLayerContextIDs",
+                                                "stopRecordingWithHandler", "saveVideoToCameraRoll"));
+}
+
 TEST_F(KelvoctlRecordingTest, WholeScreenIsAskedForInTheSizeAndWithTheMicrophoneOfTheLine) {
     EXPECT_EQ(
         KelvoctlProcess::run(socket, {"record", "--size=800x600", "--microphone", "--seconds=0.05"}).first,
@@ -90,7 +99,8 @@ TEST_F(KelvoctlRecordingTest, SecondRecordingIsRefusedAndTheFirstGoesOn) {
 
 TEST_F(KelvoctlRecordingTest, StopStopsAndSavesWhatSomebodyElseStarted) {
     daemon->isRecording = true;
-    EXPECT_EQ(KelvoctlProcess::run(socket, {"stop"}), Answer(0, "saved to the library\n"));
+    EXPECT_EQ(KelvoctlProcess::run(socket, {"stop"}),
+              Answer(0, "saving; this takes a while after a long recording\nsaved to the library\n"));
     EXPECT_THAT(daemon->requests(), ElementsAre("stopRecordingWithHandler", "saveVideoToCameraRoll"));
 }
 
@@ -107,7 +117,9 @@ TEST_F(KelvoctlRecordingTest, RecordingThatTheSystemEndsIsToldWithItsReason) {
     ASSERT_TRUE(record.waitForLine("recording;"));
     client().recordingDidStopWithError(errorSaying("a call came"), std::nullopt);
     EXPECT_EQ(record.waitForExit(), 1);
-    EXPECT_NE(record.output().find("kelvoctl: a call came (domain -5804)"), std::string::npos);
+    EXPECT_NE(record.output().find("kelvoctl: a call came (domain -5804)\n`kelvoctl library` tells"),
+              std::string::npos)
+        << record.output();
 }
 
 TEST_F(KelvoctlRecordingTest, RecordingThatTheDeviceLockEndsIsToldWithItsReason) {

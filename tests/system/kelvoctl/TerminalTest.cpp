@@ -80,6 +80,7 @@ TEST_F(TerminalTest, RunningTimeIsRedrawnOnOneLineAndTakenAwayAtTheEnd) {
         "recording; Ctrl-C stops and saves\r\n"
         "(\r\x1b\\[31m●\x1b\\[0m 0:[0-9]{2} )+"
         "\r\x1b\\[K"
+        "saving; this takes a while after a long recording\r\n"
         "saved [0-9.]+ s to the library\r\n");
     EXPECT_TRUE(std::regex_match(terminal.shown(), expected)) << terminal.shown();
     EXPECT_NE(terminal.shown().find(" 0:00 "), std::string::npos) << "it begins when the recording does";

@@ -26,5 +26,13 @@ loudest=$(ffmpeg -nostdin -i "$movie" -map 0:a -af volumedetect -f null - 2>&1 |
 [ "$(ffprobe -v error -of csv=p=0 -show_entries stream=width,height "$sheet")" = 826,580 ] || fail "the sheet is wrong"
 
 # Wrong arguments are told, and nothing is started for them.
-if "$record" --seconds soon >"$work/said" 2>&1; then fail "a wrong number is taken"; fi
-grep -q '^record: --seconds needs a number, not soon$' "$work/said" || fail "the wrong number is not named"
+refused() {
+    said=$1
+    shift
+    if "$record" "$@" >"$work/said" 2>&1; then fail "$* is taken"; fi
+    grep -qxF "record: $said" "$work/said" || fail "it is not said what is wrong with $*"
+}
+refused "--seconds needs a number above 0, not soon" --seconds soon
+refused "--seconds needs a number above 0, not 0.0" --seconds 0.0
+refused "there is no folder for $work/none/sheet.png" --sheet "$work/none/sheet.png"
+refused "there is no kelvod in $work" --build "$work"

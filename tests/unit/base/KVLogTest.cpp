@@ -13,11 +13,23 @@ using testing::ElementsAre;
 TEST(KVLogTest, EachCallIsOneLineAtItsLevel) {
     const LogRecorder log;
     KVLog("event %i", 1);
+    KVLogSample("sample %d", 2);
     KVLogError("error %s", "two");
     KVLogConsole("printed");
     EXPECT_THAT(log.lines(), ElementsAre(LogRecorder::Line{LogLevel::info, "event 1"},
+                                         LogRecorder::Line{LogLevel::sample, "sample 2"},
                                          LogRecorder::Line{LogLevel::error, "error two"},
                                          LogRecorder::Line{LogLevel::console, "printed"}));
+}
+
+TEST(KVLogTest, WhatBecameOfSamplesCanBeLeftOut) {
+    const LogRecorder log;
+    setLogsSamples(false);
+    KVLogSample("sample %d", 1);
+    KVLog("event");
+    setLogsSamples(true);
+    KVLogSample("sample %d", 2);
+    EXPECT_THAT(log.texts(), ElementsAre("event", "sample 2"));
 }
 
 TEST(KVLogTest, ControlCharactersBecomeSpaces) {

@@ -24,6 +24,14 @@ TEST(OptionsTest, WithoutArgumentsItRunsOnTheRootAndLogsToTheJournal) {
     EXPECT_EQ(options->log, Options::Log::journal);
     EXPECT_EQ(options->resourceFolder, "");
     EXPECT_FALSE(options->savesToUsersVideos);
+    EXPECT_TRUE(options->logsSamples);
+}
+
+TEST(OptionsTest, WhatBecameOfSamplesIsLeftOutOfTheLog) {
+    const auto options = parse({"--no-sample-log", "--root", "/d"});
+    ASSERT_TRUE(options);
+    EXPECT_FALSE(options->logsSamples);
+    EXPECT_EQ(options->root, "/d");
 }
 
 TEST(OptionsTest, ValuesStandBehindTheOptionOrItsEqualsSign) {
@@ -51,6 +59,7 @@ TEST(OptionsTest, WhatIsWrongIsNamed) {
     EXPECT_EQ(problemWith({"--log", "paper"}), "--log needs \"journal\" or \"stderr\"");
     EXPECT_EQ(problemWith({"--log"}), "--log needs \"journal\" or \"stderr\"");
     EXPECT_EQ(problemWith({"--user-videos=x"}), "--user-videos takes no value");
+    EXPECT_EQ(problemWith({"--no-sample-log=x"}), "--no-sample-log takes no value");
     EXPECT_EQ(problemWith({"--help=x"}), "--help takes no value");
 }
 

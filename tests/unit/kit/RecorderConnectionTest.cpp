@@ -1,5 +1,6 @@
 #include "RecorderFixture.h"
 #include "kit/LocalDaemon.h"
+#include "support/TemporaryDirectory.h"
 
 namespace kelvokit {
 namespace {
@@ -132,11 +133,25 @@ TEST_F(RecorderConnectionTest, HandlerThatRunsAtOnceMayMakeRequests) {
 
 TEST(SocketPathTest, OptionWinsOverTheEnvironmentAndThatOverTheUsualPlace) {
     ::unsetenv("KELVO_SOCKET");
+    ::unsetenv("XDG_RUNTIME_DIR");
     EXPECT_EQ(socketPath({}), "/run/kelvod/com.quillon.kelvod");
     ::setenv("KELVO_SOCKET", "/tmp/named", 1);
     EXPECT_EQ(socketPath({}), "/tmp/named");
     EXPECT_EQ(socketPath({.socketPath = "/tmp/given", .executor = {}}), "/tmp/given");
     ::unsetenv("KELVO_SOCKET");
+}
+
+TEST(SocketPathTest, UsersOwnDaemonComesBeforeTheDevicesOnceItsSocketIsThere) {
+    const kelvo::test::TemporaryDirectory folder;
+    ::unsetenv("KELVO_SOCKET");
+    ::setenv("XDG_RUNTIME_DIR", folder.path().c_str(), 1);
+    EXPECT_EQ(socketPath({}), "/run/kelvod/com.quillon.kelvod");
+    folder.write("kelvod/com.quillon.kelvod", "");
+    EXPECT_EQ(socketPath({}), folder.path() + "/kelvod/com.quillon.kelvod");
+    ::setenv("KELVO_SOCKET", "/tmp/named", 1);
+    EXPECT_EQ(socketPath({}), "/tmp/named");
+    ::unsetenv("KELVO_SOCKET");
+    ::unsetenv("XDG_RUNTIME_DIR");
 }
 
 TEST(LocalRecorderTest, AbsentDaemonIsToldWithATextForTheUser) {

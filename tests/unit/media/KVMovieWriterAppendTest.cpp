@@ -59,7 +59,7 @@ TEST_F(KVMovieWriterAppendTest, VideoSamplesAreAppendedInOrder) {
     appendVideo(300);
     EXPECT_EQ(video()->presentationValues(), (Values{100, 200, 300}));
     EXPECT_EQ(writer->lastVideoPresentationTime(), MediaTime::make(300, kNanoseconds));
-    EXPECT_EQ(log.count(LogLevel::info, "appending video sample"), 2U);
+    EXPECT_EQ(log.count(LogLevel::sample, "appending video sample"), 2U);
 }
 
 TEST_F(KVMovieWriterAppendTest, EveryFrameTellsWhenItWasCapturedAndWhenItIsPresented) {
@@ -238,7 +238,7 @@ TEST_P(KVMovieWriterAudioTest, AudioIsAppendedToItsOwnInput) {
     EXPECT_EQ(audio1()->samples().size() + audio2()->samples().size(), 1U);
     EXPECT_EQ(lastTime(), MediaTime::make(110, kNanoseconds));
     EXPECT_EQ(
-        log.count(LogLevel::info, numbered("appending audio ", " sample with timestamp:110 duration:10")),
+        log.count(LogLevel::sample, numbered("appending audio ", " sample with timestamp:110 duration:10")),
         1U);
 }
 

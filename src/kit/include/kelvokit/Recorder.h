@@ -25,7 +25,8 @@ using Dictionary = std::map<std::string, Value>;
 using Executor = std::function<void(std::function<void()>)>;
 
 struct RecorderOptions {
-    /// The daemon's socket. Empty: the environment's KELVO_SOCKET, else /run/kelvod/com.quillon.kelvod.
+    /// The daemon's socket. Empty: the environment's KELVO_SOCKET, else the one of the user's own daemon,
+    /// $XDG_RUNTIME_DIR/kelvod/com.quillon.kelvod, if it is there, else /run/kelvod/com.quillon.kelvod.
     std::string socketPath;
     /// Empty: threads of the library, one at a time.
     Executor executor;

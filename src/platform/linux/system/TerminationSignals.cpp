@@ -11,6 +11,15 @@
 #include <utility>
 
 namespace kelvo {
+namespace {
+
+/// As it is under nohup. A signal that is blocked would come all the same.
+bool isIgnored(int signal) {
+    struct sigaction action {};
+    return ::sigaction(signal, nullptr, &action) == 0 && action.sa_handler == SIG_IGN;
+}
+
+}  // namespace
 
 TerminationSignals::TerminationSignals() : stopEvent_(::eventfd(0, EFD_CLOEXEC)) {
     std::signal(SIGPIPE, SIG_IGN);
@@ -18,6 +27,7 @@ TerminationSignals::TerminationSignals() : stopEvent_(::eventfd(0, EFD_CLOEXEC))
     sigemptyset(&set);
     sigaddset(&set, SIGTERM);
     sigaddset(&set, SIGINT);
+    if (!isIgnored(SIGHUP)) sigaddset(&set, SIGHUP);
     ::pthread_sigmask(SIG_BLOCK, &set, nullptr);
     signals_.reset(::signalfd(-1, &set, SFD_CLOEXEC));
 }

@@ -7,8 +7,9 @@
 
 namespace kelvo {
 
-/// Turns SIGTERM and SIGINT into a call. Made first thing in `main`, before any other thread starts, so that
-/// no thread is interrupted by them; ignores SIGPIPE, too, whose cause every write reports anyway.
+/// Turns SIGTERM, SIGINT and, unless it is ignored, SIGHUP (the terminal was closed) into a call. Made first
+/// thing in `main`, before any other thread starts, so that no thread is interrupted by them; ignores
+/// SIGPIPE, too, whose cause every write reports anyway.
 class TerminationSignals {
   public:
     TerminationSignals();

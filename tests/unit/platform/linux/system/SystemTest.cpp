@@ -94,7 +94,19 @@ TEST_P(TerminationSignalsTest, SignalRunsTheHandler) {
               7);
 }
 
-INSTANTIATE_TEST_SUITE_P(Signals, TerminationSignalsTest, testing::Values(SIGTERM, SIGINT));
+INSTANTIATE_TEST_SUITE_P(Signals, TerminationSignalsTest, testing::Values(SIGTERM, SIGINT, SIGHUP));
+
+TEST(NoTerminationSignalTest, HangUpThatIsIgnoredStaysSo) {
+    EXPECT_EQ(exitStatusOf([] {
+                  std::signal(SIGHUP, SIG_IGN);  // as nohup does
+                  const TerminationSignals signals;
+                  ::kill(::getpid(), SIGHUP);
+                  sigset_t waiting;
+                  ::sigpending(&waiting);
+                  return sigismember(&waiting, SIGHUP);
+              }),
+              0);
+}
 
 TEST(NoTerminationSignalTest, WithoutASignalTheHandlerNeverRuns) {
     EXPECT_EQ(exitStatusOf([] {
