@@ -6,13 +6,19 @@
 namespace kelvo {
 namespace {
 
-/// Logs `text`, then sends a callback over `connection`; a failed delivery logs `failureText` and its code.
+/// Sends a callback over `connection`; a failed delivery logs `failureText` and its code.
 template <typename Send>
-void sendTo(const IPCConnectionRef& connection, const char* text, const char* failureText, Send send) {
-    KVLog("%s", text);
+void deliverTo(const IPCConnectionRef& connection, const char* failureText, Send send) {
     if (!connection) return;
     RemoteClient client = remoteClient(*connection, failureText);
     send(client);
+}
+
+/// Logs `text`, then delivers.
+template <typename Send>
+void sendTo(const IPCConnectionRef& connection, const char* text, const char* failureText, Send send) {
+    KVLog("%s", text);
+    deliverTo(connection, failureText, send);
 }
 
 }  // namespace
@@ -57,19 +63,21 @@ void KVClientProxy::updateBroadcastURL(const URL& broadcastURL) {
 
 void KVClientProxy::captureHandlerWithSample(const std::shared_ptr<KVIOSurfaceObject>& surface,
                                              const RecordBytes<TimingRecord>& timingData) {
-    sendTo(connection(), "KVClientProxy:captureHandlerWithSample:",
-           "KVClientProxy:captureHandlerWithSample: error getting remote proxy",
-           [&](auto& client) { client.captureHandlerWithSample(surface, timingData); });
+    KVLogSample("KVClientProxy:captureHandlerWithSample:");
+    deliverTo(connection(), "KVClientProxy:captureHandlerWithSample: error getting remote proxy",
+              [&](auto& client) { client.captureHandlerWithSample(surface, timingData); });
 }
 
 void KVClientProxy::captureHandlerWithAudioSample(std::span<const std::byte> audioData,
                                                   const RecordBytes<AudioFormatRecord>& absdData,
                                                   std::int64_t itemCount, SampleBuffer::Type bufferType,
                                                   const RecordBytes<TimingRecord>& timingData) {
-    sendTo(connection(), "KVClientProxy:captureHandlerWithAudioSample:",
-           "KVClientProxy:captureHandlerWithAudioSample: error getting remote proxy", [&](auto& client) {
-               client.captureHandlerWithAudioSample(audioData, absdData, itemCount, bufferType, timingData);
-           });
+    KVLogSample("KVClientProxy:captureHandlerWithAudioSample:");
+    deliverTo(connection(), "KVClientProxy:captureHandlerWithAudioSample: error getting remote proxy",
+              [&](auto& client) {
+                  client.captureHandlerWithAudioSample(audioData, absdData, itemCount, bufferType,
+                                                       timingData);
+              });
 }
 
 /// The failure's text names another message, and misspells it; readers of logs know it so.

@@ -45,7 +45,7 @@ void KVRecordingSession::_processSampleBuffer(const SampleBufferRef& sample, con
         return;
     }
     if (paused_) {
-        KVLog("session is paused discard sample");
+        KVLogSample("session is paused discard sample");
         shouldStopLock_.leaveTaken();
         return;
     }
