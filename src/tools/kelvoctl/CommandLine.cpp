@@ -89,7 +89,7 @@ constexpr std::array<CommandText, 9> kCommands{{
      "an object with \"callback\" and its arguments.\n"
      "\n"
      "Example:\n"
-     "  kelvoctl watch --json | jq -r 'select(.callback == \"recordingTimerDidUpdate\").timerText'\n"},
+     "  kelvoctl watch --json | jq -r .callback\n"},
     {Command::shell, "shell", "--answer", "show the system's alerts here and answer them",
      "Usage: kelvoctl shell [--answer default|alternate|other|cancel] [--json]\n"
      "\n"
