@@ -3,7 +3,6 @@
 // second. Beside it, with the same rhythm, the least that two processes can do: one small datagram there and
 // one back.
 #include "ProcessorTime.h"
-#include "base/KVLog.h"
 #include "base/VideoSurfacePool.h"
 #include "ipc/KVClientProtocolTable.h"
 #include "ipc/KVClientProxy.h"
@@ -145,15 +144,9 @@ class Other {
     pid_t process_ = -1;
 };
 
-/// Log lines are written as far as the journal; the journal's own work is not ours.
-struct Nowhere : LogSink {
-    void write(LogLevel, std::string_view) override {}
-};
-
 std::pair<double, Report> measureCapture(std::chrono::nanoseconds interval) {
     const test::TemporaryDirectory root;
     const Other client([&] { return application(root.path() + "/run/kelvod/com.quillon.kelvod"); });
-    setLogSink(std::make_shared<Nowhere>());
     SocketTransport transport(std::make_shared<const DeviceRoot>(root.path(), ""), nullptr);
     const auto door = std::make_shared<test::OpenDoor>();
     const auto listener = transport.createListener("com.quillon.kelvod");
