@@ -29,4 +29,10 @@ MediaTime MovieTimeline::sourceTime(const MediaTime& captureTime) const {
     });
 }
 
+bool MovieTimeline::isBehindTheFrames(const MediaTime& captureTime) const {
+    return captureTime.isValid() && stretches_.with([&](const std::vector<Stretch>& stretches) {
+        return !stretches.empty() && compare(captureTime, stretches.back().lastFrame) > 0;
+    });
+}
+
 }  // namespace kelvo

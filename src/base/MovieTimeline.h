@@ -35,6 +35,9 @@ class MovieTimeline {
     /// When what was captured at `captureTime` is presented; invalid for what was cut out.
     MediaTime sourceTime(const MediaTime& captureTime) const;
 
+    /// Whether all frames so far, of which there is one at least, were captured before `captureTime`.
+    bool isBehindTheFrames(const MediaTime& captureTime) const;
+
   private:
     Guarded<MediaTime> start_;
     Guarded<std::vector<Stretch>> stretches_;

@@ -54,6 +54,7 @@ void KVMovieWriter::reportMissingMovie(const URLHandler& handler) {
 void KVMovieWriter::completeMovie(const std::shared_ptr<MediaFileWriter>& writer, URLHandler handler) {
     const MediaTime end = trimVideoPresentationTime_.exchange(MediaTime::invalid());
     if (end.isValid()) writer->endSession(end);
+    if (const MediaTime captureEnd = captureEnd_.copy(); captureEnd.isValid()) writer->endCapture(captureEnd);
     writer->finishWriting([self = shared_from_this(), writer, handler = std::move(handler)] {
         if (handler) handler(writer->outputURL());
         self->didProcessFirstSample_ = false;

@@ -74,6 +74,9 @@ class KVMovieWriter : public MovieWriter, public std::enable_shared_from_this<KV
     void trimMovieWithURL(const URL& url, double startClipDuration, double endClipDuration,
                           const URL& outputFileURL, URLHandler handler) override;
 
+    /// The movie's last frame is to be shown until `captureTime` of the host's clock, when the capture ended;
+    /// for a screen that stands still there is no other. A stop mark counts more. Caller's thread.
+    void captureEnded(const MediaTime& captureTime) override { captureEnd_.set(captureTime); }
     /// The movie is to end at the last video frame appended so far. Caller's thread.
     void notifyRecordingMayBeStopped() override;
     /// Takes that back. Caller's thread.
@@ -157,6 +160,7 @@ class KVMovieWriter : public MovieWriter, public std::enable_shared_from_this<KV
     Track audio2_;
     Guarded<std::shared_ptr<MediaFileWriter>> assetWriter_;
     Guarded<MediaTime> trimVideoPresentationTime_;
+    Guarded<MediaTime> captureEnd_;
     Guarded<std::shared_ptr<const KVBroadcastConfiguration>> broadcastConfig_;
     std::atomic<bool> didProcessFirstSample_ = false;
     std::atomic<bool> isFinishingWriting_ = false;

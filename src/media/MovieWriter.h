@@ -35,6 +35,8 @@ class MovieWriter {
     virtual void trimMovieWithURL(const URL& url, double startClipDuration, double endClipDuration,
                                   const URL& outputFileURL, URLHandler handler) = 0;
 
+    /// Nothing is captured after this moment of the host's clock.
+    virtual void captureEnded(const MediaTime& captureTime) = 0;
     virtual void notifyRecordingMayBeStopped() = 0;
     virtual void notifyRecordingResumed() = 0;
 };

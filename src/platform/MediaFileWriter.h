@@ -17,8 +17,8 @@ enum class MediaFileType { mpeg4 };
 /// simulated device; driven by a movie writer. Thread-safe.
 ///
 /// Order of calls: `addInput` for each track, `startWriting`, `startSession`, samples to the inputs and
-/// `relateTimes`, optionally `endSession`, `finishWriting`. A writer serves one file. One that is destroyed
-/// before it finished leaves the file as it lies, playable up to its last fragment.
+/// `relateTimes`, optionally `endCapture` and `endSession`, `finishWriting`. A writer serves one file. One
+/// that is destroyed before it finished leaves the file as it lies, playable up to its last fragment.
 class MediaFileWriter {
   public:
     /// The numbers are the ones that logs show.
@@ -51,8 +51,12 @@ class MediaFileWriter {
     /// but for what was written before the change was told; that stays, and what would lie over it is cut.
     virtual void relateTimes(const MediaTime& captureTime, const MediaTime& sourceTime) = 0;
 
-    /// The movie ends at `sourceTime`: what lies at or after it is not in the movie, whether it was appended
-    /// already or not.
+    /// Nothing is captured after `captureTime` of the host's clock: unless frames were, the movie ends there,
+    /// and its last frame is shown until then. A screen that stands still has delivered no other.
+    virtual void endCapture(const MediaTime& captureTime) = 0;
+
+    /// The movie ends at `sourceTime`, whatever `endCapture` said: what lies at or after it is not in the
+    /// movie, whether it was appended already or not.
     virtual void endSession(const MediaTime& sourceTime) = 0;
 
     /// Takes no more samples, writes what was appended and completes the file. `completion` runs once, on a

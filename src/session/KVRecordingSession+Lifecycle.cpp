@@ -1,6 +1,7 @@
 #include "base/KVLog.h"
 #include "session/KVRecordingSession.h"
 
+#include <ratio>
 #include <set>
 #include <utility>
 
@@ -165,10 +166,20 @@ void KVRecordingSession::stopAllCapture() {
     haveMicTap_ = false;
 }
 
+/// A movie of a screen that stands still lasts until its end; that of a paused recording ended with the
+/// pause.
+void KVRecordingSession::noteCaptureEnd() {
+    const auto writer = movieWriter();
+    if (!writer || paused_) return;
+    const auto now = services_.platform.clock->monotonicNow();
+    writer->captureEnded(MediaTime::make(now.count(), std::nano::den));
+}
+
 void KVRecordingSession::stopRecordingWithNotification(bool notify, const OptionalError& error) {
     // A failing source and a finishing owner may come at once: the first of them stops the recording.
     if (!recording_.exchange(false)) return;
     KVLog("KVRecordingSession: stop");
+    noteCaptureEnd();
     stopAllCapture();
     isBroadcasting_ = false;
     if (notify) {

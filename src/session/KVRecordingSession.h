@@ -166,6 +166,7 @@ class KVRecordingSession : public RecordingSession,
     /// Stops a running recording; with `notify` the delegate hears of it.
     void stopRecordingWithNotification(bool notify, const OptionalError& error);
     void stopAllCapture();
+    void noteCaptureEnd();
 
     // Environment.
     void frontmostApplicationDidChange(std::int32_t processIdentifier) override;

@@ -97,6 +97,8 @@ class SimulatedFileWriter : public MediaFileWriter, public std::enable_shared_fr
     /// Invalid until the session begins or is ended.
     MediaTime sessionStart() const { return sessionStart_.copy(); }
     MediaTime sessionEnd() const { return sessionEnd_.copy(); }
+    /// What `endCapture` was told; it changes nothing here.
+    MediaTime captureEnd() const { return captureEnd_.copy(); }
     /// What `relateTimes` was told.
     const MovieTimeline& timeline() const { return timeline_; }
 
@@ -109,6 +111,7 @@ class SimulatedFileWriter : public MediaFileWriter, public std::enable_shared_fr
     void relateTimes(const MediaTime& captureTime, const MediaTime& sourceTime) override {
         timeline_.relate(captureTime, sourceTime);
     }
+    void endCapture(const MediaTime& captureTime) override { captureEnd_.set(captureTime); }
     void endSession(const MediaTime& sourceTime) override { sessionEnd_.set(sourceTime); }
     void finishWriting(std::function<void()> completion) override;
 
@@ -124,6 +127,7 @@ class SimulatedFileWriter : public MediaFileWriter, public std::enable_shared_fr
     Guarded<OptionalError> error_;
     Guarded<MediaTime> sessionStart_;
     Guarded<MediaTime> sessionEnd_;
+    Guarded<MediaTime> captureEnd_;
     MovieTimeline timeline_;
 };
 

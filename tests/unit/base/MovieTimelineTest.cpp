@@ -49,6 +49,16 @@ TEST(MovieTimelineTest, TimesThatAreNotValidRelateNothing) {
     EXPECT_TRUE(timeline.stretches().empty());
 }
 
+TEST(MovieTimelineTest, OnlyLaterMomentsAreBehindTheFrames) {
+    MovieTimeline timeline;
+    EXPECT_FALSE(timeline.isBehindTheFrames(at(5)));
+    timeline.relate(at(5), at(5));
+    timeline.relate(at(20), at(8));
+    EXPECT_FALSE(timeline.isBehindTheFrames(MediaTime::invalid()));
+    EXPECT_FALSE(timeline.isBehindTheFrames(at(20)));
+    EXPECT_TRUE(timeline.isBehindTheFrames(at(21)));
+}
+
 TEST(MovieTimelineTest, OldStretchesAreForgotten) {
     MovieTimeline timeline;
     for (int i = 0; i < 1000; ++i)

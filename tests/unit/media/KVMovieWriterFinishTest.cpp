@@ -139,6 +139,14 @@ TEST_F(KVMovieWriterFinishTest, ResumedRecordingKeepsWhatCameAfterTheMark) {
     EXPECT_FALSE(fileWriter()->sessionEnd().isValid());
 }
 
+TEST_F(KVMovieWriterFinishTest, FileIsToldWhenTheCaptureEnded) {
+    startMovie();
+    writer->captureEnded(MediaTime::make(700, kNanoseconds));
+    finish();
+    EXPECT_EQ(fileWriter()->captureEnd(), MediaTime::make(700, kNanoseconds));
+    EXPECT_FALSE(fileWriter()->sessionEnd().isValid());
+}
+
 TEST_F(KVMovieWriterFinishTest, StopMarkBeforeASecondFrameMarksNothing) {
     startMovie();
     writer->notifyRecordingMayBeStopped();

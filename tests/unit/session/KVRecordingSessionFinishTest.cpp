@@ -2,6 +2,8 @@
 
 #include <cerrno>
 
+#include <gmock/gmock.h>
+
 namespace kelvo::test {
 namespace {
 
@@ -18,6 +20,21 @@ TEST_F(SessionFixture, FinishYieldsTheMovie) {
     EXPECT_TRUE(log.contains("KVRecordingSession: finishSessionWithHandler"));
     EXPECT_TRUE(log.contains("KVRecordingSession: finishWritingWithHandler"));
     EXPECT_TRUE(delegate->stops.empty());
+}
+
+TEST_F(SessionFixture, MovieLastsUntilTheCaptureEnds) {
+    start();
+    device.clock->advance(std::chrono::seconds(7));
+    const auto end = device.clock->monotonicNow();
+    finish();
+    EXPECT_THAT(writer->captureEnds, testing::ElementsAre(at(end.count())));
+}
+
+TEST_F(SessionFixture, MovieOfAPausedRecordingEndsWithThePause) {
+    start();
+    session->pauseSession();
+    finish();
+    EXPECT_THAT(writer->captureEnds, testing::IsEmpty());
 }
 
 TEST_F(SessionFixture, MovieOfASessionThatIsGoneIsStillHandedOver) {

@@ -51,6 +51,7 @@ class FakeMovieWriter : public MovieWriter {
         trims.push_back({url, startClipDuration, endClipDuration, outputFileURL});
         handler(outputFileURL);
     }
+    void captureEnded(const MediaTime& captureTime) override { captureEnds.push_back(captureTime); }
     void notifyRecordingMayBeStopped() override { ++mayBeStopped; }
     void notifyRecordingResumed() override { ++resumed; }
 
@@ -70,6 +71,7 @@ class FakeMovieWriter : public MovieWriter {
 
     const Size windowSize;
     const std::string outputPath;
+    std::vector<MediaTime> captureEnds;
     std::shared_ptr<const KVBroadcastConfiguration> broadcastConfig;
     bool systemRecording = false;
     bool acceptsVideo = true;

@@ -55,11 +55,19 @@ void LavFileWriter::finishWriting(std::function<void()> completion) {
     });
 }
 
+/// When the movie ends on its timeline; invalid where its samples end.
+MediaTime LavFileWriter::end() const {
+    if (const MediaTime end = end_.copy(); end.isValid()) return end;
+    const MediaTime captureEnd = captureEnd_.copy();
+    return session_->timeline.isBehindTheFrames(captureEnd) ? session_->timeline.sourceTime(captureEnd)
+                                                            : MediaTime::invalid();
+}
+
 void LavFileWriter::finish() {
     for (const auto& input : inputs_.copy())
         input->flush();
-    const MediaTime end = end_.copy() - session_->timeline.start();
-    if (const OptionalError error = session_->muxer->finish(end)) session_->fail(*error);
+    const MediaTime duration = end() - session_->timeline.start();
+    if (const OptionalError error = session_->muxer->finish(duration)) session_->fail(*error);
     auto expected = Status::writing;
     session_->status.compare_exchange_strong(expected, Status::completed);
 }

@@ -27,17 +27,20 @@ class LavFileWriter : public MediaFileWriter, public std::enable_shared_from_thi
     void relateTimes(const MediaTime& captureTime, const MediaTime& sourceTime) override {
         session_->timeline.relate(captureTime, sourceTime);
     }
+    void endCapture(const MediaTime& captureTime) override { captureEnd_.set(captureTime); }
     void endSession(const MediaTime& sourceTime) override { end_.set(sourceTime); }
     void finishWriting(std::function<void()> completion) override;
 
   private:
     OptionalError openMovie();
     void finish();
+    MediaTime end() const;
 
     const URL url_;
     const std::string path_;
     const std::shared_ptr<WriterSession> session_ = std::make_shared<WriterSession>();
     Guarded<std::vector<std::shared_ptr<LavWriterInput>>> inputs_;
+    Guarded<MediaTime> captureEnd_;
     Guarded<MediaTime> end_;
     std::atomic<bool> hasStarted_{false};
     SerialQueue queue_;

@@ -105,6 +105,55 @@ TEST_F(LavFileWriterTest, MovieEndsExactlyWhereItsSessionWasEnded) {
     EXPECT_NEAR(static_cast<double>(decodedSound(path, "a:0").size()) / 44100, 1.25, 0.024);
 }
 
+class CaptureEndTest : public LavFileWriterTest {
+  protected:
+    CaptureEndTest() {
+        EXPECT_TRUE(movie.start());
+        showAt(0, 0);
+    }
+    void showAt(double captured, double presented) {
+        movie.writer()->relateTimes(MediaTime::make(movie.timeAt(captured), kSecond),
+                                    MediaTime::make(movie.timeAt(presented), kSecond));
+        movie.appendWhenReady(movie.video(), testFrame({320, 240}, 0, movie.timeAt(presented)));
+    }
+    void endCapture(double captured) {
+        movie.writer()->endCapture(MediaTime::make(movie.timeAt(captured), kSecond));
+    }
+    std::string finishedDuration() {
+        EXPECT_EQ(movie.finish(), Status::completed);
+        EXPECT_EQ(decodingComplaints(path), "");
+        return probeFormat(path, "duration");
+    }
+
+    TestMovie movie{service, path, {}};
+};
+
+TEST_F(CaptureEndTest, PictureThatStandsStillLastsUntilThen) {
+    endCapture(2.5);
+    EXPECT_EQ(finishedDuration(), "2.500000");
+    EXPECT_EQ(frameTimes(path, "v:0").size(), 1U);
+}
+
+TEST_F(CaptureEndTest, WhatPausesCutOutIsNotShown) {
+    showAt(11, 1);
+    endCapture(12);
+    EXPECT_EQ(finishedDuration(), "2.000000");
+}
+
+TEST_F(CaptureEndTest, LaterFramesCountMore) {
+    showAt(2, 2);
+    endCapture(1.5);
+    EXPECT_NEAR(std::atof(finishedDuration().c_str()), 2.03, 0.02);
+    EXPECT_EQ(frameTimes(path, "v:0").size(), 2U);
+}
+
+TEST_F(CaptureEndTest, EndOfTheSessionCountsMore) {
+    showAt(1, 1);
+    endCapture(2.5);
+    movie.writer()->endSession(MediaTime::make(movie.timeAt(1.5), kSecond));
+    EXPECT_EQ(finishedDuration(), "1.500000");
+}
+
 TEST_F(LavFileWriterTest, FrameAtTheEndIsNotInTheMovie) {
     TestMovie movie(service, path, {});
     ASSERT_TRUE(movie.start());
