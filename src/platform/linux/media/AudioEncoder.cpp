@@ -1,7 +1,8 @@
 #include "platform/linux/media/AudioEncoder.h"
 
+#include "platform/linux/media/AacBitstream.h"
+
 #include <algorithm>
-#include <cstring>
 
 namespace kelvo {
 namespace {
@@ -9,70 +10,49 @@ namespace {
 /// After this much silence each further frame of silence encodes to the same bytes.
 constexpr std::int64_t kFramesUntilSteady = 8;
 
-CodecContextPointer configuredContext(const AVCodec& codec, const AudioSettings& settings) {
-    CodecContextPointer context(avcodec_alloc_context3(&codec));
-    if (!context) return nullptr;
-    context->sample_fmt = AV_SAMPLE_FMT_FLTP;
-    context->sample_rate = settings.sampleRate;
-    context->ch_layout = AV_CHANNEL_LAYOUT_STEREO;
-    context->bit_rate = settings.bitRate;
-    context->time_base = {1, settings.sampleRate};
-    context->profile = FF_PROFILE_AAC_LOW;
-    context->flags |= AV_CODEC_FLAG_GLOBAL_HEADER;
-    return context;
+/// How much sound an encoder has to hear before it goes on exactly as one that has heard everything.
+constexpr std::size_t kFramesOfMemory = 8;
+
+/// One channel gets what the track gets, but for the bits of the second one.
+AudioSettings settingsOfOneChannel(AudioSettings settings) {
+    constexpr std::int64_t kFrameSize = 1024;
+    constexpr std::int64_t kLeast = 8000;
+    settings.bitRate =
+        std::max(kLeast, settings.bitRate - kAacSecondChannelBits * settings.sampleRate / kFrameSize);
+    return settings;
 }
 
-FramePointer frameFor(const AVCodecContext& context) {
-    FramePointer frame(av_frame_alloc());
-    if (!frame) return nullptr;
-    frame->format = context.sample_fmt;
-    frame->sample_rate = context.sample_rate;
-    frame->ch_layout = AV_CHANNEL_LAYOUT_STEREO;
-    frame->nb_samples = context.frame_size;
-    return av_frame_get_buffer(frame.get(), 0) < 0 ? nullptr : std::move(frame);
+TrackFormat trackFormatFor(const AacEncoder& encoder, const AudioSettings& settings) {
+    TrackFormat format;
+    format.type = MediaType::audio;
+    format.timescale = static_cast<std::uint32_t>(settings.sampleRate);
+    format.lead = encoder.lead();
+    format.codecConfiguration = aacStereoConfiguration(encoder.configuration());
+    format.sampleRate = static_cast<std::uint32_t>(settings.sampleRate);
+    format.channelCount = 2;
+    format.bitRate = static_cast<std::uint32_t>(settings.bitRate);
+    return format;
 }
 
 }  // namespace
 
 Result<std::unique_ptr<AudioEncoder>> AudioEncoder::open(const AudioSettings& settings,
                                                          SampleHandler handler) {
-    prepareLav();
-    const AVCodec* codec = avcodec_find_encoder(AV_CODEC_ID_AAC);
-    CodecContextPointer context = codec == nullptr ? nullptr : configuredContext(*codec, settings);
-    const bool isOpen =
-        context && avcodec_open2(context.get(), codec, nullptr) >= 0 && context->frame_size > 0;
+    auto encoder = AacEncoder::open(settingsOfOneChannel(settings), 1);
+    if (!encoder) return encoder.error();
     // The constructor is private, so that every encoder is open.
-    std::unique_ptr<AudioEncoder> encoder(isOpen ? new AudioEncoder(std::move(context), std::move(handler))
-                                                 : nullptr);
-    if (!encoder || !encoder->frame_ || !encoder->packet_) {
-        return mediaError(kMediaErrorEncoderUnavailable, "no AAC encoder takes these settings");
-    }
-    return encoder;
+    return std::unique_ptr<AudioEncoder>(new AudioEncoder(settings, std::move(*encoder), std::move(handler)));
 }
 
-AudioEncoder::AudioEncoder(CodecContextPointer context, SampleHandler handler)
-    : context_(std::move(context)),
+AudioEncoder::AudioEncoder(const AudioSettings& settings, AacEncoder encoder, SampleHandler handler)
+    : settings_(settings),
       handler_(std::move(handler)),
-      frame_(frameFor(*context_)),
-      packet_(av_packet_alloc()),
-      frameSize_(static_cast<std::size_t>(context_->frame_size)) {}
-
-TrackFormat AudioEncoder::trackFormat() const {
-    TrackFormat format;
-    format.type = MediaType::audio;
-    format.timescale = static_cast<std::uint32_t>(context_->sample_rate);
-    format.lead = context_->initial_padding;
-    const auto extra =
-        std::as_bytes(std::span(context_->extradata, static_cast<std::size_t>(context_->extradata_size)));
-    format.codecConfiguration.assign(extra.begin(), extra.end());
-    format.sampleRate = static_cast<std::uint32_t>(context_->sample_rate);
-    format.channelCount = 2;
-    format.bitRate = static_cast<std::uint32_t>(context_->bit_rate);
-    return format;
-}
+      encoder_(std::move(encoder)),
+      format_(trackFormatFor(encoder_, settings)),
+      frameSize_(encoder_.frameSize()) {}
 
 void AudioEncoder::begin(std::int64_t position) {
-    nextDecodeTime_ = position - context_->initial_padding;
+    nextDecodeTime_ = position - format_.lead;
 }
 
 OptionalError AudioEncoder::samples(std::span<const float> left, std::span<const float> right) {
@@ -94,7 +74,7 @@ OptionalError AudioEncoder::silence(std::int64_t count) {
     if (repeated <= 0) return encodeZeros(count);
     if (OptionalError error = encodeZeros(kFramesUntilSteady * frameSize)) return error;
     for (std::int64_t i = 0; i < repeated; ++i)
-        handOver(lastSample_, static_cast<std::uint32_t>(frameSize));
+        handOver(frameSize);
     return encodeZeros(count - (kFramesUntilSteady + repeated) * frameSize);
 }
 
@@ -104,43 +84,57 @@ OptionalError AudioEncoder::encodeZeros(std::int64_t count) {
 }
 
 OptionalError AudioEncoder::encodeGathered() {
-    if (av_frame_make_writable(frame_.get()) < 0) return KVError::posix(ENOMEM, "audio encoder");
-    frame_->nb_samples = static_cast<int>(left_.size());
-    frame_->pts = encodedCount_;
-    encodedCount_ += static_cast<std::int64_t>(left_.size());
-    std::memcpy(frame_->data[0], left_.data(), left_.size() * sizeof(float));
-    std::memcpy(frame_->data[1], right_.data(), right_.size() * sizeof(float));
+    if (encoder_.channelCount() == 1 && left_ != right_) {
+        if (OptionalError error = encodeBothChannelsFromNowOn()) return error;
+    }
+    OptionalError error = encoder_.encode(left_, right_, packetHandler());
+    if (encoder_.channelCount() == 1) {
+        latest_.push_back(left_);
+        if (latest_.size() > kFramesOfMemory) latest_.pop_front();
+    }
     left_.clear();
     right_.clear();
-    return send(frame_.get());
+    return error;
+}
+
+/// The new encoder first hears what the old one heard at last, so that its frames join the old one's: they
+/// overlap, and their windows depend on the sound before.
+OptionalError AudioEncoder::encodeBothChannelsFromNowOn() {
+    auto encoder = AacEncoder::open(settings_, 2);
+    if (!encoder) return encoder.error();
+    const auto isHandedOver = [](std::span<const std::byte>, std::int64_t) { return OptionalError(); };
+    for (const std::vector<float>& heard : latest_) {
+        if (OptionalError error = encoder->encode(heard, heard, isHandedOver)) return error;
+    }
+    latest_.clear();
+    encoder_ = std::move(*encoder);
+    return std::nullopt;
 }
 
 OptionalError AudioEncoder::flush() {
     if (!left_.empty()) {
         if (OptionalError error = encodeGathered()) return error;
     }
-    return encodedCount_ == 0 ? std::nullopt : send(nullptr);
+    return encoder_.flush(packetHandler());
 }
 
-OptionalError AudioEncoder::send(const AVFrame* frame) {
-    int result = avcodec_send_frame(context_.get(), frame);
-    while (result >= 0) {
-        result = avcodec_receive_packet(context_.get(), packet_.get());
-        if (result < 0) break;
-        const auto data = std::as_bytes(std::span(packet_->data, static_cast<std::size_t>(packet_->size)));
-        lastSample_.assign(data.begin(), data.end());
-        const auto whole = static_cast<std::int64_t>(frameSize_);
-        handOver(lastSample_, static_cast<std::uint32_t>(
-                                  packet_->duration > 0 ? std::min(packet_->duration, whole) : whole));
-        av_packet_unref(packet_.get());
-    }
-    if (result == AVERROR(EAGAIN) || result == AVERROR_EOF) return std::nullopt;
-    return lavError(result, kMediaErrorEncodingFailed, "audio encoder");
+AacEncoder::PacketHandler AudioEncoder::packetHandler() {
+    return [this](std::span<const std::byte> frame, std::int64_t duration) -> OptionalError {
+        if (encoder_.channelCount() == 1) {
+            auto stereo = aacStereoFrame(frame);
+            if (!stereo) return stereo.error();
+            lastSample_ = std::move(*stereo);
+        } else {
+            lastSample_.assign(frame.begin(), frame.end());
+        }
+        handOver(duration);
+        return std::nullopt;
+    };
 }
 
 /// Times are counted here: the encoder does not know of the silence that it was spared.
-void AudioEncoder::handOver(std::span<const std::byte> data, std::uint32_t duration) {
-    handler_({nextDecodeTime_, 0, duration, true}, data);
+void AudioEncoder::handOver(std::int64_t duration) {
+    handler_({nextDecodeTime_, 0, static_cast<std::uint32_t>(duration), true}, lastSample_);
     nextDecodeTime_ += duration;
 }
 
