@@ -23,6 +23,7 @@ WIDTH, HEIGHT, RATE = 1080, 1920, 60
 PICTURES = 50  # a second: fewer than frames, so that each one has its turn
 THREADS = max(1, min(4, os.cpu_count()))
 PEER_QUEUE = 16  # grabbed pictures: with its usual 8, ffmpeg leaves out a third of them and so encodes less
+TURNS = 2  # of each, one after the other
 COUNTER = (400, 250, 8, 5)  # pixels and blocks of the numbered picture in the screen's corner
 QUIET = {"stdout": subprocess.DEVNULL, "stderr": subprocess.DEVNULL}
 
@@ -111,11 +112,22 @@ def numbers_in(movie):
     return numbers
 
 
-def pictures(movie):
-    """How many pictures are in the movie, and how many in per cent were on the screen meanwhile and are not."""
-    numbers = set(numbers_in(movie))
-    shown = max(numbers) - min(numbers) + 1
-    return len(numbers), 100 * (shown - len(numbers)) / shown
+def pictures(movies):
+    """How many pictures are in the movies, and how many in per cent were on the screen meanwhile and are not."""
+    kept, shown = 0, 0
+    for movie in movies:
+        numbers = set(numbers_in(movie))
+        kept += len(numbers)
+        shown += max(numbers) - min(numbers) + 1
+    return kept, 100 * (shown - kept) / shown
+
+
+def kelvod(daemon, seconds, output):
+    """Processor seconds and peak kilobytes of the daemon while it records."""
+    daemon.reset_peak()
+    before = daemon.processor_seconds()
+    daemon.record(seconds, output)
+    return daemon.processor_seconds() - before, daemon.kilobytes("VmHWM")
 
 
 def ffmpeg(seconds, output):
@@ -133,7 +145,9 @@ def ffmpeg(seconds, output):
     return usage.ru_utime + usage.ru_stime, usage.ru_maxrss
 
 
-def compare(daemon, folder, name, share, bound, seconds):
+def take_turns(daemon, folder, share, seconds):
+    """What each turn cost, ours and theirs; who goes first changes, as machines change their speed meanwhile."""
+    costs = {"ours": [], "theirs": []}
     with running(daemon.build / "moving_screen", os.environ["DISPLAY"], PICTURES, share, stdout=subprocess.PIPE,
                  text=True) as screen:
         screen.stdout.readline()
@@ -141,24 +155,33 @@ def compare(daemon, folder, name, share, bound, seconds):
         with running("sh", "-c", "exec pacat --playback --raw --rate=44100 --channels=1 --format=s16le "
                      f"--device=speaker {folder}/tone", env=pulse_client, **QUIET):
             daemon.record(1, folder / "warm.mp4")
+            (folder / "warm.mp4").unlink()
             time.sleep(1)
-            daemon.reset_peak()
-            before = daemon.processor_seconds()
-            daemon.record(seconds, folder / "ours.mp4")
-            ours = daemon.processor_seconds() - before
-            theirs, peak = ffmpeg(seconds, folder / "theirs.mp4")
-    print(f"{name + ': processor seconds':44} {ours:9.2f} {theirs:9.2f} {ours / theirs:7.2f}   bound {bound}")
-    memory = daemon.kilobytes("VmHWM")
+            for turn in range(TURNS):
+                for side in sorted(costs, reverse=turn % 2 == 1):
+                    movie = folder / f"{side}{turn}.mp4"
+                    costs[side].append(kelvod(daemon, seconds / TURNS, movie) if side == "ours"
+                                       else ffmpeg(seconds / TURNS, movie))
+    return costs
+
+
+def compare(daemon, folder, name, share, bound, seconds):
+    costs = take_turns(daemon, folder, share, seconds)
+    (ours, memory), (theirs, peak) = ((sum(used for used, _ in costs[side]), max(peak for _, peak in costs[side]))
+                                      for side in ("ours", "theirs"))
+    ratios = [mine / other for (mine, _), (other, _) in zip(costs["ours"], costs["theirs"])]
+    print(f"{name + ': processor seconds':44} {ours:9.2f} {theirs:9.2f} {ours / theirs:7.3f}   bound {bound}   "
+          f"({min(ratios):.3f} to {max(ratios):.3f} in {TURNS} turns)")
     print(f"{'  peak memory, MB':44} {memory / 1024:9.1f} {peak / 1024:9.1f} {memory / peak:7.2f}   bound 0.50")
+    movies = {side: [folder / f"{side}{turn}.mp4" for turn in range(TURNS)] for side in costs}
     if share > 0:
-        (our_pictures, ours_missed), (their_pictures, theirs_missed) = (
-            pictures(folder / f"{movie}.mp4") for movie in ("ours", "theirs"))
+        (our_pictures, ours_missed), (their_pictures, theirs_missed) = map(pictures, movies.values())
         print(f"{'  pictures missed, %':44} {ours_missed:9.2f} {theirs_missed:9.2f}           bound 0.1")
         # Who leaves out pictures has less to encode.
         cost, peer_cost = 1000 * ours / our_pictures, 1000 * theirs / their_pictures
         print(f"{'  processor ms for each picture that is kept':44} {cost:9.2f} {peer_cost:9.2f} {cost / peer_cost:7.2f}")
-    for movie in ("ours", "theirs", "warm"):
-        (folder / f"{movie}.mp4").unlink()
+    for movie in movies["ours"] + movies["theirs"]:
+        movie.unlink()
 
 
 def percentile(values, share):
