@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
 """Whole recordings by the daemon: what they cost against ffmpeg, how soon they begin and end, and what they leave.
 
-    bench/recording.py [BUILD_FOLDER] [--seconds 20] [--recordings 200] [--long 60]
+    bench/recording.py [BUILD_FOLDER] [--seconds 40] [--recordings 200] [--long 60]
 
 Starts an X server of 1080x1920, a PulseAudio server with a microphone and an application that plays, and a program that
 scrolls text. The peer is `ffmpeg -f x11grab` on the same screen and the same sound, one after the other, with the encoder,
@@ -23,7 +23,7 @@ WIDTH, HEIGHT, RATE = 1080, 1920, 60
 PICTURES = 50  # a second: fewer than frames, so that each one has its turn
 THREADS = max(1, min(4, os.cpu_count()))
 PEER_QUEUE = 16  # grabbed pictures: with its usual 8, ffmpeg leaves out a third of them and so encodes less
-TURNS = 2  # of each, one after the other
+TURNS = 4  # of each, one after the other
 COUNTER = (400, 250, 8, 5)  # pixels and blocks of the numbered picture in the screen's corner
 QUIET = {"stdout": subprocess.DEVNULL, "stderr": subprocess.DEVNULL}
 
@@ -274,7 +274,7 @@ def stage(build, *options):
 
 def main():
     parser = command_line()
-    parser.add_argument("--seconds", type=float, default=20)
+    parser.add_argument("--seconds", type=float, default=40)
     parser.add_argument("--recordings", type=int, default=200)
     parser.add_argument("--long", type=float, default=60)
     arguments = parser.parse_args()
