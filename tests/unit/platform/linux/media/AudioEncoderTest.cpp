@@ -35,10 +35,8 @@ class AudioEncoderTest : public ::testing::Test {
         }));
 };
 
-constexpr std::size_t kSecond = kTestRate;
-
 TEST_F(AudioEncoderTest, SameSoundLeftAndRightComesOutTheSame) {
-    const Samples tone = sine(2 * kSecond, 440);
+    const Samples tone = sine(2 * kTestRate, 440);
     EXPECT_FALSE(encoder->samples(tone, tone));
     const auto channels = finish();
     EXPECT_EQ(channels[0], channels[1]);
@@ -46,8 +44,8 @@ TEST_F(AudioEncoderTest, SameSoundLeftAndRightComesOutTheSame) {
 }
 
 TEST_F(AudioEncoderTest, DifferentSoundLeftAndRightComesOutDifferent) {
-    const Samples left = sine(2 * kSecond, 440);
-    const Samples right = sine(2 * kSecond, 1000);
+    const Samples left = sine(2 * kTestRate, 440);
+    const Samples right = sine(2 * kTestRate, 1000);
     EXPECT_FALSE(encoder->samples(left, right));
     const auto channels = finish();
     EXPECT_GT(distance(left, channels[0], 0, left.size()), 20);
@@ -55,8 +53,8 @@ TEST_F(AudioEncoderTest, DifferentSoundLeftAndRightComesOutDifferent) {
 }
 
 TEST_F(AudioEncoderTest, SecondChannelSetsInWithoutAGap) {
-    const std::size_t change = kSecond + 300;
-    const Samples left = sine(2 * kSecond, 440);
+    const std::size_t change = kTestRate + 300;
+    const Samples left = sine(2 * kTestRate, 440);
     Samples right = left;
     for (std::size_t i = change; i < right.size(); ++i)
         right[i] = -right[i] / 2;
@@ -84,9 +82,9 @@ class SecondChannelAtTest : public AudioEncoderTest, public ::testing::WithParam
 INSTANTIATE_TEST_SUITE_P(FramesFromAClap, SecondChannelAtTest, ::testing::Range(-4, 6));
 
 TEST_P(SecondChannelAtTest, WindowsOfTheFramesFitTogether) {
-    const Samples left = claps(2 * kSecond);
+    const Samples left = claps(2 * kTestRate);
     Samples right = left;
-    const std::size_t change = kSecond + static_cast<std::size_t>(1024 * GetParam());
+    const std::size_t change = kTestRate + static_cast<std::size_t>(1024 * GetParam());
     std::fill(right.begin() + static_cast<std::ptrdiff_t>(change), right.end(), 0.0F);
     EXPECT_FALSE(encoder->samples(left, right));
     const auto channels = finish();
@@ -111,11 +109,11 @@ TEST_F(AudioEncoderTest, FirstSampleMayDiffer) {
 }
 
 TEST_F(AudioEncoderTest, LongSilenceBeforeDifferentSoundKeepsItsLength) {
-    const Samples left = sine(kSecond, 440);
-    EXPECT_FALSE(encoder->silence(60 * kSecond));
+    const Samples left = sine(kTestRate, 440);
+    EXPECT_FALSE(encoder->silence(60 * kTestRate));
     EXPECT_FALSE(encoder->samples(left, Samples(left.size())));
     const auto channels = finish();
-    const Samples sound(channels[0].begin() + 60 * kSecond, channels[0].end());
+    const Samples sound(channels[0].begin() + 60 * kTestRate, channels[0].end());
     EXPECT_GT(distance(left, sound, 0, left.size()), 20);
 }
 

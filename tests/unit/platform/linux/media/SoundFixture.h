@@ -16,6 +16,7 @@ namespace kelvo::test {
 using Samples = std::vector<float>;
 using Packets = std::vector<Bytes>;
 
+/// Samples a second.
 constexpr std::size_t kTestRate = 44100;
 
 inline Samples sine(std::size_t count, double hertz, double amplitude = 0.5) {
