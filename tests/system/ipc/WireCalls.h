@@ -57,7 +57,7 @@ inline Bytes wireCall(const std::string& interface, const std::string& member, c
     message.member = member;
     message.signature = signature;
     message.body = std::move(body);
-    message.descriptors.resize(descriptorsClaimed);
+    message.sentDescriptors.resize(descriptorsClaimed);
     return dbus::serialize(message);
 }
 

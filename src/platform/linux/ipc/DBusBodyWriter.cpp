@@ -9,12 +9,15 @@
 
 #include <cerrno>
 #include <cstring>
-#include <fcntl.h>
+#include <string>
 #include <string_view>
 #include <utility>
 
 namespace kelvo::dbus {
 namespace {
+
+/// What most messages' arguments fit into; larger ones grow.
+constexpr std::size_t kUsualBody = 256;
 
 class BodyWriter {
   public:
@@ -141,7 +144,7 @@ class BodyWriter {
         const auto* handle = value.as<std::shared_ptr<ObjectHandle>>();
         const auto endpoint =
             handle != nullptr ? std::dynamic_pointer_cast<SocketEndpoint>(*handle) : nullptr;
-        return endpoint && putDescriptor(endpoint->descriptor());
+        return endpoint && putDescriptor({endpoint, endpoint->descriptor()});
     }
     bool writeSurface(const Value& value) {
         const auto* handle = value.as<std::shared_ptr<ObjectHandle>>();
@@ -149,14 +152,13 @@ class BodyWriter {
         if (!surface) return false;
         surface->keepOutNewWriters();
         const VideoSurface::Geometry& geometry = surface->geometry();
-        return putDescriptor(surface->descriptor()) && put(geometry.width) && put(geometry.height) &&
-               put(geometry.bytesPerRow) && put(static_cast<std::uint32_t>(geometry.pixelFormat));
+        return putDescriptor({surface, surface->descriptor()}) && put(geometry.width) &&
+               put(geometry.height) && put(geometry.bytesPerRow) &&
+               put(static_cast<std::uint32_t>(geometry.pixelFormat));
     }
-    bool putDescriptor(int descriptor) {
-        UniqueFd duplicate(::fcntl(descriptor, F_DUPFD_CLOEXEC, 0));
-        if (!duplicate) return false;
-        put(static_cast<std::uint32_t>(message_.descriptors.size()));
-        message_.descriptors.push_back(std::move(duplicate));
+    bool putDescriptor(SentDescriptor descriptor) {
+        put(static_cast<std::uint32_t>(message_.sentDescriptors.size()));
+        message_.sentDescriptors.push_back(std::move(descriptor));
         return true;
     }
     template <typename Number>
@@ -177,8 +179,9 @@ class BodyWriter {
 }  // namespace
 
 OptionalError writeBody(const Array& values, Message& message) {
+    message.body.reserve(kUsualBody);
     if (BodyWriter(message).write(values)) return std::nullopt;
-    return KVError::posix(EINVAL, "arguments of " + message.member);
+    return KVError::posix(EINVAL, "arguments of " + std::string(message.member));
 }
 
 }  // namespace kelvo::dbus

@@ -8,16 +8,24 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <memory>
 #include <optional>
 #include <span>
-#include <string>
+#include <string_view>
 #include <vector>
 
 namespace kelvo::dbus {
 
 enum class MessageType : std::uint8_t { call = 1, reply = 2, error = 3, signal = 4 };
 
-/// One D-Bus message. Little endian on the wire, as all peers of this machine write.
+/// A descriptor that goes with a message. It is the owner's, and open for as long as that is held.
+struct SentDescriptor {
+    std::shared_ptr<const ObjectHandle> owner;
+    int descriptor = -1;
+};
+
+/// One D-Bus message. Little endian on the wire, as all peers of this machine write. Its texts are views: of
+/// the bytes that it was parsed from, or of whatever its maker keeps for as long as the message is used.
 struct Message {
     static constexpr std::uint8_t kNoReplyExpected = 1;
 
@@ -25,13 +33,14 @@ struct Message {
     std::uint8_t flags = 0;
     std::uint32_t serial = 0;
     std::uint32_t replySerial = 0;  ///< 0: none
-    std::string path;
-    std::string interface;
-    std::string member;
-    std::string errorName;
-    std::string signature;
+    std::string_view path;
+    std::string_view interface;
+    std::string_view member;
+    std::string_view errorName;
+    std::string_view signature;
     Bytes body;
-    std::vector<UniqueFd> descriptors;
+    std::vector<UniqueFd> descriptors;            ///< that came with it
+    std::vector<SentDescriptor> sentDescriptors;  ///< that go with it
 
     /// A reply or an error, without its content, to the message with this serial.
     static Message replying(MessageType type, std::uint32_t serial) {
@@ -52,15 +61,15 @@ inline constexpr std::size_t kFixedHeader = 16;
 /// larger than the bounds.
 Result<std::size_t> messageSize(std::span<const std::byte> head);
 
-/// Exactly one message, without its descriptors; `descriptorCount` says how many it claims. Fails on anything
-/// that is not well-formed.
+/// Exactly one message, without its descriptors; `descriptorCount` says how many it claims. Its texts stay
+/// where `bytes` are. Fails on anything that is not well-formed.
 Result<Message> parse(std::span<const std::byte> bytes, std::uint32_t& descriptorCount);
 
 /// The bytes that are sent for a message; its descriptors go beside them.
 Bytes serialize(const Message& message);
 
 /// Appends `values`, one for each complete type of `signature`. Fails when one does not fit its type, which
-/// is a bug of the sender. Objects add to `descriptors`: duplicates, so that the object may go.
+/// is a bug of the sender. Objects add to `sentDescriptors`.
 OptionalError writeBody(const Array& values, Message& message);
 
 /// Makes a surface of what a message says about it, as `VideoSurface::fromDescriptor` does.

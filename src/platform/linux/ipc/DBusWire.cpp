@@ -61,7 +61,7 @@ class HeaderReader {
         if (type == "u") return readNumber(field);
         if (type != "s" && type != "o" && type != "g") return fail();
         const std::string_view content = type == "g" ? text(byte()) : text(number());
-        if (std::string* place = placeOf(field, type)) *place = content;
+        if (std::string_view* place = placeOf(field, type)) *place = content;
     }
     void readNumber(std::uint8_t field) {
         const std::uint32_t content = number();
@@ -69,7 +69,7 @@ class HeaderReader {
         if (field == kDescriptors) descriptorCount_ = content;
     }
     /// Where the field goes; none for one that says nothing here, or that has a wrong type.
-    std::string* placeOf(std::uint8_t field, std::string_view type) {
+    std::string_view* placeOf(std::uint8_t field, std::string_view type) {
         switch (field) {
             case kPath:
                 return check(type == "o") ? &message_.path : nullptr;
@@ -142,7 +142,7 @@ class HeaderWriter {
         putText(kErrorName, 's', message_.errorName);
         putNumberField(kReplySerial, message_.replySerial);
         putText(kSignature, 'g', message_.signature);
-        putNumberField(kDescriptors, static_cast<std::uint32_t>(message_.descriptors.size()));
+        putNumberField(kDescriptors, static_cast<std::uint32_t>(message_.sentDescriptors.size()));
         const auto fields = static_cast<std::uint32_t>(out_.size() - kFixedHeader);
         std::memcpy(out_.data() + 12, &fields, sizeof(fields));
         align(8);
@@ -150,7 +150,7 @@ class HeaderWriter {
     }
 
   private:
-    void putText(Field field, char type, const std::string& text) {
+    void putText(Field field, char type, std::string_view text) {
         if (text.empty()) return;
         begin(field, type);
         if (type == 'g') {
@@ -158,7 +158,8 @@ class HeaderWriter {
         } else {
             putNumber(static_cast<std::uint32_t>(text.size()));
         }
-        append(text.c_str(), text.size() + 1);
+        append(text.data(), text.size());
+        put(0);
     }
     void putNumberField(Field field, std::uint32_t number) {
         if (number == 0) return;

@@ -7,6 +7,7 @@
 #include <array>
 #include <cerrno>
 #include <cstring>
+#include <iterator>
 #include <sys/socket.h>
 
 namespace kelvo {
@@ -37,7 +38,7 @@ bool allowsObjects(const std::vector<IPCArgument>& arguments) {
 OptionalError writeWithinBounds(const Array& values, dbus::Message& message) {
     if (OptionalError error = dbus::writeBody(values, message)) return error;
     if (message.body.size() <= ipc_bounds::kLargestMessage - ipc_bounds::kLargestHeader) return std::nullopt;
-    return KVError::posix(EMSGSIZE, "arguments of " + message.member);
+    return KVError::posix(EMSGSIZE, "arguments of " + std::string(message.member));
 }
 
 KVError notConnected() {
@@ -46,28 +47,28 @@ KVError notConnected() {
 
 }  // namespace
 
-void SocketConnection::handle(dbus::Message message) {
+void SocketConnection::handle(dbus::Message& message) {
     switch (message.type) {
         case dbus::MessageType::call:
-            return handleCall(std::move(message));
+            return handleCall(message);
         case dbus::MessageType::reply:
         case dbus::MessageType::error:
-            return handleReply(std::move(message));
+            return handleReply(message);
         case dbus::MessageType::signal:
             return;  // allowed, and of no interest
     }
 }
 
-void SocketConnection::handleCall(dbus::Message message) {
+void SocketConnection::handleCall(dbus::Message& message) {
     const auto interface = exportedInterface();
     const bool isOurs = interface && message.path == kObjectPath &&
                         (message.interface.empty() || message.interface == interface->name);
     const auto method = isOurs ? interface->indexOf(message.member) : std::nullopt;
     if (!method) return handleStandardCall(message);
-    handleExportedCall(std::move(message), *method, *interface);
+    handleExportedCall(message, *method, *interface);
 }
 
-void SocketConnection::handleExportedCall(dbus::Message message, std::size_t method,
+void SocketConnection::handleExportedCall(dbus::Message& message, std::size_t method,
                                           const IPCInterface& interface) {
     const IPCMethod& description = interface.methods[method];
     if (message.signature != signatureOf(description.arguments))
@@ -111,7 +112,7 @@ IPCReply SocketConnection::replyTo(std::uint32_t serial, const IPCMethod& method
             reply = dbus::Message::replying(dbus::MessageType::error, serial);
             reply.errorName = "org.freedesktop.DBus.Error.Failed";
         }
-        reply.member.clear();
+        reply.member = {};
         self->sendMessage(std::move(reply));
     };
 }
@@ -119,7 +120,7 @@ IPCReply SocketConnection::replyTo(std::uint32_t serial, const IPCMethod& method
 /// What every D-Bus object answers, and what tools ask before they call.
 void SocketConnection::handleStandardCall(const dbus::Message& message) {
     const auto interface = exportedInterface();
-    const std::string call = message.interface + "." + message.member;
+    const std::string call = std::string(message.interface) + "." + std::string(message.member);
     if (call == "org.freedesktop.DBus.Hello") return answer(message, "s", {":1.1"});
     if (call == "org.freedesktop.DBus.Peer.Ping") return answer(message, "", {});
     if (call == "org.freedesktop.DBus.Properties.GetAll") return answer(message, "a{sv}", {Dictionary()});
@@ -130,7 +131,8 @@ void SocketConnection::handleStandardCall(const dbus::Message& message) {
             if (message.path == path) return answer(message, "s", {dbus::parentXML(child)});
         }
     }
-    if (message.path != kObjectPath) return answerError(message, kUnknownObject, "no object " + message.path);
+    if (message.path != kObjectPath)
+        return answerError(message, kUnknownObject, "no object " + std::string(message.path));
     answerError(message, kUnknownMethod, "no method " + call);
 }
 
@@ -149,7 +151,7 @@ void SocketConnection::answerError(const dbus::Message& call, const char* name, 
     if (!dbus::writeBody({text}, reply)) sendMessage(std::move(reply));
 }
 
-void SocketConnection::handleReply(dbus::Message message) {
+void SocketConnection::handleReply(dbus::Message& message) {
     const auto interface = remoteInterface();
     std::pair<ReplyIdentifier, std::size_t> awaited{0, 0};
     std::map<std::uint32_t, LentSurfaces>::node_type returned;  // goes back after the lock is free
@@ -161,7 +163,7 @@ void SocketConnection::handleReply(dbus::Message message) {
     }
     if (awaited.first == 0 || !interface) return;
     if (message.type == dbus::MessageType::error)
-        return receivedError(awaited.first, KVError::posix(EPROTO, message.errorName));
+        return receivedError(awaited.first, KVError::posix(EPROTO, std::string(message.errorName)));
     const std::vector<IPCArgument>& expected = *interface->methods[awaited.second].reply;
     if (message.signature != signatureOf(expected)) return cutOff("reply of another signature");
     auto values = dbus::readBody(message, allowsObjects(expected));
@@ -180,7 +182,8 @@ OptionalError SocketConnection::transmit(std::size_t method, const IPCMethod& de
     call.path = kObjectPath;
     call.interface = interface->name;
     call.member = description.name;
-    call.signature = signatureOf(description.arguments);
+    const std::string signature = signatureOf(description.arguments);
+    call.signature = signature;
     if (OptionalError error = writeWithinBounds(arguments, call)) return error;
     return sendCall(std::move(call), identifier, method, std::move(lent), whenUnsent);
 }
@@ -220,7 +223,7 @@ std::uint32_t SocketConnection::nextSerial() {
 
 /// Queues a message. False when that passes a bound; then nothing was queued.
 bool SocketConnection::push(dbus::Message message, ErrorReport whenUnsent) {
-    return push({dbus::serialize(message), 0, std::move(message.descriptors), std::move(whenUnsent)});
+    return push({dbus::serialize(message), 0, std::move(message.sentDescriptors), std::move(whenUnsent)});
 }
 
 bool SocketConnection::push(Outgoing outgoing) {
@@ -250,9 +253,21 @@ void SocketConnection::afterPush(bool isWithinBounds) {
 }
 
 SocketConnection::Flushed SocketConnection::flush(int socket) {
+    // They may be somebody else's surfaces, whose last reference tells another connection that they are free.
+    SentDescriptors goneAfterTheLock;
     const std::lock_guard lock(outMutex_);
+    return flushUnderLock(socket, goneAfterTheLock);
+}
+
+void SocketConnection::dropUnsent(SentDescriptors& gone) {
+    for (Outgoing& each : out_.queue)
+        std::ranges::move(each.descriptors, std::back_inserter(gone));
+    reportUnsent(reportsOf(std::exchange(out_.queue, {})));
+}
+
+SocketConnection::Flushed SocketConnection::flushUnderLock(int socket, SentDescriptors& gone) {
     if (!maySend()) return Flushed::some;
-    if (cannotSend_) reportUnsent(reportsOf(std::exchange(out_.queue, {})));
+    if (cannotSend_) dropUnsent(gone);
     while (!out_.queue.empty()) {
         Outgoing& next = out_.queue.front();
         alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int) * ipc_bounds::kMostDescriptors)> control{};
@@ -268,7 +283,7 @@ SocketConnection::Flushed SocketConnection::flush(int socket) {
             item->cmsg_type = SCM_RIGHTS;
             item->cmsg_len = CMSG_LEN(sizeof(int) * next.descriptors.size());
             for (std::size_t i = 0; i < next.descriptors.size(); ++i) {
-                const int descriptor = next.descriptors[i].get();
+                const int descriptor = next.descriptors[i].descriptor;
                 std::memcpy(CMSG_DATA(item) + i * sizeof(int), &descriptor, sizeof(descriptor));
             }
         }
@@ -277,10 +292,11 @@ SocketConnection::Flushed SocketConnection::flush(int socket) {
         if (count < 0 && errno == EAGAIN) return Flushed::some;
         if (count < 0) {
             cannotSend_ = true;
-            reportUnsent(reportsOf(std::exchange(out_.queue, {})));
+            dropUnsent(gone);
             break;
         }
         out_.unsentDescriptors -= next.descriptors.size();
+        std::ranges::move(next.descriptors, std::back_inserter(gone));
         next.descriptors.clear();
         next.sent += static_cast<std::size_t>(count);
         out_.unsentBytes -= static_cast<std::size_t>(count);

@@ -244,12 +244,12 @@ bool SocketConnection::handleNextMessage() {
     if (!message) return cutOff(message.error().localizedDescription()), false;
     if (descriptorCount > kMostDescriptors) return cutOff("more descriptors than allowed"), false;
     if (descriptorCount > receivedDescriptors_.size()) return cutOff("fewer descriptors than claimed"), false;
-    incoming_.erase(incoming_.begin(), incoming_.begin() + static_cast<std::ptrdiff_t>(*size));
     const auto last = receivedDescriptors_.begin() + descriptorCount;
     message->descriptors.assign(std::make_move_iterator(receivedDescriptors_.begin()),
                                 std::make_move_iterator(last));
     receivedDescriptors_.erase(receivedDescriptors_.begin(), last);
-    handle(std::move(*message));
+    handle(*message);
+    incoming_.erase(incoming_.begin(), incoming_.begin() + static_cast<std::ptrdiff_t>(*size));
     return true;
 }
 

@@ -48,11 +48,12 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     void didEnd() override { peer_.forget(); }
 
   private:
+    using SentDescriptors = std::vector<dbus::SentDescriptor>;
     /// A message on its way out: what is left of its bytes, and its descriptors until the first byte is gone.
     struct Outgoing {
         Bytes bytes;
         std::size_t sent = 0;
-        std::vector<UniqueFd> descriptors;
+        SentDescriptors descriptors;
         ErrorReport whenUnsent;
     };
     /// What sending threads share, under `outMutex_`.
@@ -82,11 +83,11 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     void handleReceived();
     bool authenticate();
     bool handleNextMessage();
-    void handle(dbus::Message message);
-    void handleCall(dbus::Message message);
-    void handleExportedCall(dbus::Message message, std::size_t method, const IPCInterface& interface);
+    void handle(dbus::Message& message);
+    void handleCall(dbus::Message& message);
+    void handleExportedCall(dbus::Message& message, std::size_t method, const IPCInterface& interface);
     void handleStandardCall(const dbus::Message& message);
-    void handleReply(dbus::Message message);
+    void handleReply(dbus::Message& message);
     Result<Array> readArguments(dbus::Message& message, const IPCMethod& description);
     std::shared_ptr<void> answerAtTheEnd(std::uint32_t serial);
     void letGo(std::uint32_t serial);
@@ -103,8 +104,11 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     bool push(Outgoing outgoing);
     bool pushReturns();
     static std::vector<ErrorReport> reportsOf(std::deque<Outgoing> unsent);
+    void dropUnsent(SentDescriptors& gone);
+    // Without it.
     void afterPush(bool isWithinBounds);
     Flushed flush(int socket);
+    Flushed flushUnderLock(int socket, SentDescriptors& gone);
 
     const Side side_;
     Guarded<Socket> socket_;

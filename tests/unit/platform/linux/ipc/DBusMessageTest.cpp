@@ -5,6 +5,7 @@
 #include "platform/linux/ipc/DBusMessage.h"
 #include "platform/linux/ipc/Signature.h"
 
+#include <fcntl.h>
 #include <sys/socket.h>
 
 #include <gmock/gmock.h>
@@ -179,6 +180,8 @@ class SurfaceBodyTest : public testing::Test {
     SurfaceBodyTest() {
         message.signature = "(huuuu)";
         EXPECT_FALSE(writeBody({Value(std::shared_ptr<ObjectHandle>(surface))}, message));
+        for (const SentDescriptor& sent : message.sentDescriptors)
+            message.descriptors.emplace_back(::fcntl(sent.descriptor, F_DUPFD_CLOEXEC, 0));
     }
     VideoSurfaceRef surface = *VideoSurface::create(VideoSurface::Geometry::packed(4, 2));
     Message message;
@@ -194,6 +197,17 @@ TEST_F(SurfaceBodyTest, SurfaceTravelsAsItsDescriptorAndGeometry) {
         std::dynamic_pointer_cast<VideoSurface>(*values->at(0).as<std::shared_ptr<ObjectHandle>>());
     ASSERT_NE(read, nullptr);
     EXPECT_EQ(read->geometry(), surface->geometry());
+}
+
+TEST_F(SurfaceBodyTest, DescriptorThatIsSentKeepsItsSurface) {
+    const std::weak_ptr<VideoSurface> held = surface;
+    const int descriptor = surface->descriptor();
+    surface = nullptr;
+    ASSERT_EQ(message.sentDescriptors.size(), 1U);
+    EXPECT_EQ(message.sentDescriptors.front().descriptor, descriptor) << "the surface's own";
+    EXPECT_FALSE(held.expired());
+    message.sentDescriptors.clear();
+    EXPECT_TRUE(held.expired());
 }
 
 TEST_F(SurfaceBodyTest, SurfaceWhereNoneIsAllowedIsRefused) {
