@@ -5,7 +5,20 @@
 namespace kelvo {
 namespace {
 
-constexpr std::string_view kSurfaceKey = "ioSurface";
+/// An argument as a coder: the one object that its array holds. There is no other, so a frame needs no
+/// dictionary to find it by its key.
+struct ArgumentEncoder {
+    Array& argument;
+
+    static constexpr bool isIPCCoder() { return true; }
+    void encode(std::string_view, Value object) { argument.push_back(std::move(object)); }
+};
+struct ArgumentDecoder {
+    const Array& argument;
+
+    static constexpr bool isIPCCoder() { return true; }
+    const Value* decode(std::string_view) const { return argument.empty() ? nullptr : &argument.front(); }
+};
 
 /// The one object of a class that an array holds: none for an empty array, no value for anything else.
 template <typename Object>
@@ -26,19 +39,20 @@ std::optional<std::shared_ptr<IPCEndpoint>> IPCCoding<std::shared_ptr<IPCEndpoin
 }
 
 Value IPCCoding<std::shared_ptr<KVIOSurfaceObject>>::encode(const Content& object) {
-    KVCoder coder(KVCoder::Kind::ipc);
+    Array argument;
+    ArgumentEncoder coder{argument};
     if (object) KVIOSurfaceObjectCoding::encodeWithCoder(*object, coder);
-    const Value* handle = coder.decode(kSurfaceKey);
-    return handle != nullptr ? Array{*handle} : Array();
+    return argument;
 }
 
 std::optional<std::shared_ptr<KVIOSurfaceObject>> IPCCoding<std::shared_ptr<KVIOSurfaceObject>>::decode(
     const Value& value) {
-    const auto surface = onlyObject<VideoSurface>(value);
-    if (!surface) return std::nullopt;
-    KVCoder coder(KVCoder::Kind::ipc);
-    if (*surface) coder.encode(kSurfaceKey, std::shared_ptr<ObjectHandle>(*surface));
-    return std::make_shared<KVIOSurfaceObject>(KVIOSurfaceObjectCoding::initWithCoder(coder));
+    const Array* argument = value.asArray();
+    if (argument == nullptr || argument->size() > 1) return std::nullopt;
+    auto object = std::make_shared<KVIOSurfaceObject>(
+        KVIOSurfaceObjectCoding::initWithCoder(ArgumentDecoder{*argument}));
+    const bool isSurface = argument->empty() || object->ioSurface();
+    return isSurface ? std::optional(std::move(object)) : std::nullopt;
 }
 
 }  // namespace kelvo

@@ -202,7 +202,7 @@ OptionalError ConnectionBase::trySend(std::size_t method, const Array& arguments
     }
     OptionalError error = isOver()
                               ? connectionOver()
-                              : transmit(method, description, arguments, identifier, awaited.errorHandler);
+                              : transmit(*interface, method, arguments, identifier, awaited.errorHandler);
     if (identifier == 0) return error;
     if (!error && !isOver()) return std::nullopt;
     // The connection may have ended meanwhile and reported this reply: whoever takes it reports.

@@ -65,10 +65,10 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     std::shared_ptr<const IPCInterface> exportedInterface() const;
     std::shared_ptr<const IPCInterface> remoteInterface() const { return remoteInterface_.copy(); }
 
-    /// To the transport: send this. A reply is wanted under `identifier` unless it is 0. An error means that
-    /// nothing was sent. What is only queued by then, wants no reply and is still there at the connection's
-    /// end goes to `reportUnsent`.
-    virtual OptionalError transmit(std::size_t method, const IPCMethod& description, const Array& arguments,
+    /// To the transport: send method number `method` of `interface`. A reply is wanted under `identifier`
+    /// unless it is 0. An error means that nothing was sent. What is only queued by then, wants no reply and
+    /// is still there at the connection's end goes to `reportUnsent`.
+    virtual OptionalError transmit(const IPCInterface& interface, std::size_t method, const Array& arguments,
                                    ReplyIdentifier identifier, const ErrorReport& whenUnsent) = 0;
     /// Runs what messages left behind that were taken and never sent, on the connection's queue.
     void reportUnsent(std::vector<ErrorReport> reports);

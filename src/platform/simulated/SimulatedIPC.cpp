@@ -26,7 +26,7 @@ std::uint64_t SimulatedConnection::drain() {
     return activity_;
 }
 
-OptionalError SimulatedConnection::transmit(std::size_t method, const IPCMethod&, const Array& arguments,
+OptionalError SimulatedConnection::transmit(const IPCInterface&, std::size_t method, const Array& arguments,
                                             ReplyIdentifier identifier, const ErrorReport&) {
     const auto receiver = peer();
     if (!receiver || receiver->isOver()) return KVError::posix(ENOTCONN, "connection");

@@ -44,7 +44,7 @@ class SimulatedConnection : public ConnectionBase {
     std::uint64_t drain();
 
   protected:
-    OptionalError transmit(std::size_t method, const IPCMethod& description, const Array& arguments,
+    OptionalError transmit(const IPCInterface& interface, std::size_t method, const Array& arguments,
                            ReplyIdentifier identifier, const ErrorReport& whenUnsent) override;
     void close() override;
 

@@ -73,30 +73,27 @@ void SocketConnection::handleExportedCall(dbus::Message& message, std::size_t me
     const IPCMethod& description = interface.methods[method];
     if (message.signature != signatureOf(description.arguments))
         return cutOff("signature of " + description.name + " is not what it takes");
-    auto arguments = readArguments(message, description);
-    if (!arguments) return cutOff(description.name + ": " + arguments.error().localizedDescription());
-    IPCReply reply;
-    if (message.wantsReply() && !description.isOneWay()) reply = replyTo(message.serial, description);
     // A one-way message has nothing to say, but a caller that waits for its end is let go: at once, or when
     // nobody uses the surfaces any more that came with it.
     const bool isAwaited = message.wantsReply() && description.isOneWay();
     const auto end = isAwaited ? answerAtTheEnd(message.serial) : nullptr;
-    if (end) tieSurfacesTo(end, description.arguments, *arguments);
+    auto arguments = readArguments(message, description, end);
+    if (!arguments) return cutOff(description.name + ": " + arguments.error().localizedDescription());
+    IPCReply reply;
+    if (message.wantsReply() && !description.isOneWay()) reply = replyTo(message.serial, description);
     received(method, std::move(*arguments), std::move(reply),
              {1, message.body.size(), message.descriptors.size()});
 }
 
-Result<Array> SocketConnection::readArguments(dbus::Message& message, const IPCMethod& description) {
-    const bool allowed = allowsObjects(description.arguments);
-    // Only a client is sent one frame after the other.
-    if (!allowed || side_ == Side::server) return dbus::readBody(message, allowed);
-    const auto now = loop_->now();
-    auto arguments =
-        dbus::readBody(message, allowed, [&](UniqueFd descriptor, const VideoSurface::Geometry& geometry) {
-            return surfaces_.open(std::move(descriptor), geometry, now);
-        });
-    if (!surfaces_.empty()) loop_->tickAt(now + SurfaceCache::kPatience);
-    return arguments;
+/// Its surfaces hold `lease`, if there is one.
+Result<Array> SocketConnection::readArguments(dbus::Message& message, const IPCMethod& description,
+                                              const std::shared_ptr<void>& lease) {
+    return dbus::readBody(message, allowsObjects(description.arguments),
+                          [&](UniqueFd descriptor, const VideoSurface::Geometry& geometry) {
+                              auto surface = openSurface(std::move(descriptor), geometry);
+                              if (surface && lease) *surface = tiedTo(lease, *surface);
+                              return surface;
+                          });
 }
 
 IPCReply SocketConnection::replyTo(std::uint32_t serial, const IPCMethod& method) {
@@ -171,16 +168,16 @@ void SocketConnection::handleReply(dbus::Message& message) {
     receivedReply(awaited.first, std::move(*values));
 }
 
-OptionalError SocketConnection::transmit(std::size_t method, const IPCMethod& description,
+OptionalError SocketConnection::transmit(const IPCInterface& interface, std::size_t method,
                                          const Array& arguments, ReplyIdentifier identifier,
                                          const ErrorReport& whenUnsent) {
-    const auto interface = remoteInterface();
+    const IPCMethod& description = interface.methods[method];
     LentSurfaces lent =
         description.isOneWay() ? surfacesIn(description.arguments, arguments) : LentSurfaces();
     dbus::Message call;
     call.flags = identifier == 0 && lent.empty() ? dbus::Message::kNoReplyExpected : 0;
     call.path = kObjectPath;
-    call.interface = interface->name;
+    call.interface = interface.name;
     call.member = description.name;
     const std::string signature = signatureOf(description.arguments);
     call.signature = signature;

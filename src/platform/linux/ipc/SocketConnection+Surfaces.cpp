@@ -4,6 +4,16 @@
 
 namespace kelvo {
 
+Result<VideoSurfaceRef> SocketConnection::openSurface(UniqueFd descriptor,
+                                                      const VideoSurface::Geometry& geometry) {
+    // Only a client is sent one frame after the other.
+    if (side_ == Side::server) return VideoSurface::fromDescriptor(std::move(descriptor), geometry);
+    const Moment now = loop_->now();
+    auto surface = surfaces_.open(std::move(descriptor), geometry, now);
+    if (surface) loop_->tickAt(now + SurfaceCache::kPatience);
+    return surface;
+}
+
 /// Answers, with nothing, when its last reference goes.
 std::shared_ptr<void> SocketConnection::answerAtTheEnd(std::uint32_t serial) {
     if (side_ == Side::client) {

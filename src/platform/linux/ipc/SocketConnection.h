@@ -39,7 +39,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     std::optional<Moment> tick(Moment now) override;
 
   protected:
-    OptionalError transmit(std::size_t method, const IPCMethod& description, const Array& arguments,
+    OptionalError transmit(const IPCInterface& interface, std::size_t method, const Array& arguments,
                            ReplyIdentifier identifier, const ErrorReport& whenUnsent) override;
     void didResume() override;
     void didServe() override;
@@ -88,7 +88,9 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     void handleExportedCall(dbus::Message& message, std::size_t method, const IPCInterface& interface);
     void handleStandardCall(const dbus::Message& message);
     void handleReply(dbus::Message& message);
-    Result<Array> readArguments(dbus::Message& message, const IPCMethod& description);
+    Result<Array> readArguments(dbus::Message& message, const IPCMethod& description,
+                                const std::shared_ptr<void>& lease);
+    Result<VideoSurfaceRef> openSurface(UniqueFd descriptor, const VideoSurface::Geometry& geometry);
     std::shared_ptr<void> answerAtTheEnd(std::uint32_t serial);
     void letGo(std::uint32_t serial);
     std::optional<Moment> returnSurfacesWhenDue(Moment now);

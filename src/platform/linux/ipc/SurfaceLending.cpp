@@ -10,7 +10,7 @@ namespace {
 
 /// What stands behind a lent surface: goes when the surface's last reference does.
 struct Loan {
-    std::shared_ptr<ObjectHandle> surface;
+    VideoSurfaceRef surface;
     std::shared_ptr<void> lease;
 };
 
@@ -33,14 +33,8 @@ LentSurfaces surfacesIn(const std::vector<IPCArgument>& description, const Array
     return surfaces;
 }
 
-void tieSurfacesTo(const std::shared_ptr<void>& lease, const std::vector<IPCArgument>& description,
-                   Array& arguments) {
-    for (std::size_t i = 0; i < std::min(description.size(), arguments.size()); ++i) {
-        const auto surface = surfaceIn(description[i], arguments[i]);
-        if (!surface) continue;
-        const auto loan = std::make_shared<Loan>(Loan{surface, lease});
-        arguments[i] = Array{std::shared_ptr<ObjectHandle>(loan, surface.get())};
-    }
+VideoSurfaceRef tiedTo(const std::shared_ptr<void>& lease, const VideoSurfaceRef& surface) {
+    return {std::make_shared<Loan>(Loan{surface, lease}), surface.get()};
 }
 
 bool SurfaceReturns::letGo(std::uint32_t serial, Moment now) {

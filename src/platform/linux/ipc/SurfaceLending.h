@@ -22,10 +22,9 @@ using LentSurfaces = std::vector<std::shared_ptr<ObjectHandle>>;
 /// The surfaces among a message's arguments.
 LentSurfaces surfacesIn(const std::vector<IPCArgument>& description, const Array& arguments);
 
-/// Makes each surface among the arguments hold `lease` as well: it goes with the last reference to the last
-/// of them.
-void tieSurfacesTo(const std::shared_ptr<void>& lease, const std::vector<IPCArgument>& description,
-                   Array& arguments);
+/// The same surface, which holds `lease` as well: that goes with the last reference to the last of a
+/// message's surfaces.
+VideoSurfaceRef tiedTo(const std::shared_ptr<void>& lease, const VideoSurfaceRef& surface);
 
 /// The messages of a peer whose surfaces this side has let go of without having said so. Whoever sends one
 /// frame after the other needs none of them back at once, so it is told of a few together and woken once for
