@@ -150,12 +150,12 @@ TEST_F(SurfaceLendingTest, OneMemoryFileIsMappedOnce) {
 TEST(SurfaceReturnsTest, AFewAreToldOfTogether) {
     SurfaceReturns returns;
     for (std::uint32_t serial = 1; serial < SurfaceReturns::kMostTogether; ++serial) {
-        returns.hold();
+        EXPECT_FALSE(returns.hold());
         EXPECT_FALSE(returns.letGo(serial, {}));
     }
-    returns.hold();
+    EXPECT_FALSE(returns.hold());
     EXPECT_TRUE(returns.letGo(9, {}));
-    EXPECT_EQ(returns.take(), (std::vector<std::uint32_t>{1, 2, 3, 9}));
+    EXPECT_EQ(returns.take(), (std::vector<std::uint32_t>{1, 2, 3, 4, 5, 9}));
     EXPECT_EQ(returns.take(), std::vector<std::uint32_t>());
 }
 
@@ -166,6 +166,19 @@ TEST(SurfaceReturnsTest, NothingWaitsWhileOthersAreHeld) {
     EXPECT_TRUE(returns.letGo(1, {}));
     EXPECT_EQ(returns.take(), std::vector<std::uint32_t>{1});
     EXPECT_FALSE(returns.letGo(2, {}));
+}
+
+TEST(SurfaceReturnsTest, WhatWaitsGoesBackWhenMoreThanOneIsHeld) {
+    SurfaceReturns returns;
+    EXPECT_FALSE(returns.hold());
+    EXPECT_FALSE(returns.hold()) << "nothing waits";
+    EXPECT_TRUE(returns.letGo(1, {}));
+    returns.take();
+    EXPECT_FALSE(returns.letGo(2, {}));
+    EXPECT_FALSE(returns.hold());
+    EXPECT_TRUE(returns.hold());
+    EXPECT_EQ(returns.take(), std::vector<std::uint32_t>{2});
+    EXPECT_FALSE(returns.hold());
 }
 
 TEST(SurfaceReturnsTest, TheFirstThatWaitsSaysHowLong) {

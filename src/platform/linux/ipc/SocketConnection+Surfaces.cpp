@@ -17,8 +17,8 @@ Result<VideoSurfaceRef> SocketConnection::openSurface(UniqueFd descriptor,
 /// Answers, with nothing, when its last reference goes.
 std::shared_ptr<void> SocketConnection::answerAtTheEnd(std::uint32_t serial) {
     if (side_ == Side::client) {
-        const std::lock_guard lock(outMutex_);
-        out_.returns.hold();
+        std::unique_lock lock(outMutex_);
+        if (out_.returns.hold()) sendReturns(std::move(lock));
     }
     const std::weak_ptr weakSelf = std::static_pointer_cast<SocketConnection>(shared_from_this());
     // What it points to is of no interest, as long as it is something.
@@ -37,8 +37,12 @@ void SocketConnection::letGo(std::uint32_t serial) {
         lock.unlock();
         return loop_->tickAt(now + SurfaceReturns::kPatience);
     }
+    sendReturns(std::move(lock));
+}
+
+void SocketConnection::sendReturns(std::unique_lock<std::mutex> outLock) {
     const bool isWithinBounds = pushReturns();
-    lock.unlock();
+    outLock.unlock();
     afterPush(isWithinBounds);
 }
 
@@ -59,9 +63,7 @@ std::optional<SocketWatcher::Moment> SocketConnection::returnSurfacesWhenDue(Mom
     std::unique_lock lock(outMutex_);
     const auto due = out_.returns.due();
     if (!due || *due > now) return due;
-    const bool isWithinBounds = pushReturns();
-    lock.unlock();
-    afterPush(isWithinBounds);
+    sendReturns(std::move(lock));
     return std::nullopt;
 }
 

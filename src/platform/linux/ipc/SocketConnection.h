@@ -93,6 +93,7 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     Result<VideoSurfaceRef> openSurface(UniqueFd descriptor, const VideoSurface::Geometry& geometry);
     std::shared_ptr<void> answerAtTheEnd(std::uint32_t serial);
     void letGo(std::uint32_t serial);
+    void sendReturns(std::unique_lock<std::mutex> outLock);
     std::optional<Moment> returnSurfacesWhenDue(Moment now);
     IPCReply replyTo(std::uint32_t serial, const IPCMethod& method);
     void answer(const dbus::Message& call, const std::string& signature, const Array& values);

@@ -28,18 +28,19 @@ VideoSurfaceRef tiedTo(const std::shared_ptr<void>& lease, const VideoSurfaceRef
 
 /// The messages of a peer whose surfaces this side has let go of without having said so. Whoever sends one
 /// frame after the other needs none of them back at once, so it is told of a few together and woken once for
-/// them; but without delay while this side holds on to others, as then its pool may run dry. Under the
+/// them; but without delay while this side holds more than one, as then its pool may run dry. Under the
 /// owner's lock.
 class SurfaceReturns {
   public:
     using Moment = std::chrono::steady_clock::time_point;
 
-    static constexpr std::size_t kMostTogether = 4;
+    /// A pool of eight has one for the frame that is looked at then, and one for the next.
+    static constexpr std::size_t kMostTogether = 6;
     /// How long one waits for the others.
     static constexpr std::chrono::milliseconds kPatience{250};
 
-    /// A message with surfaces came.
-    void hold() { ++held_; }
+    /// A message with surfaces came. True when the peer is to be told now.
+    bool hold() { return held_++ > 0 && !waiting_.empty(); }
     /// The surfaces of the message with this serial are let go of. True when the peer is to be told now.
     bool letGo(std::uint32_t serial, Moment now);
     /// The serials of which the peer is to be told. None waits any more.
