@@ -110,7 +110,7 @@ IPCReply SocketConnection::replyTo(std::uint32_t serial, const IPCMethod& method
             reply.errorName = "org.freedesktop.DBus.Error.Failed";
         }
         reply.member = {};
-        self->sendMessage(std::move(reply));
+        self->sendMessage(reply);
     };
 }
 
@@ -137,7 +137,7 @@ void SocketConnection::answer(const dbus::Message& call, const std::string& sign
     if (!call.wantsReply()) return;
     dbus::Message reply = dbus::Message::replying(dbus::MessageType::reply, call.serial);
     reply.signature = signature;
-    if (!dbus::writeBody(values, reply)) sendMessage(std::move(reply));
+    if (!dbus::writeBody(values, reply)) sendMessage(reply);
 }
 
 void SocketConnection::answerError(const dbus::Message& call, const char* name, const std::string& text) {
@@ -145,7 +145,7 @@ void SocketConnection::answerError(const dbus::Message& call, const char* name, 
     dbus::Message reply = dbus::Message::replying(dbus::MessageType::error, call.serial);
     reply.errorName = name;
     reply.signature = "s";
-    if (!dbus::writeBody({text}, reply)) sendMessage(std::move(reply));
+    if (!dbus::writeBody({text}, reply)) sendMessage(reply);
 }
 
 void SocketConnection::handleReply(dbus::Message& message) {
@@ -182,10 +182,10 @@ OptionalError SocketConnection::transmit(const IPCInterface& interface, std::siz
     const std::string signature = signatureOf(description.arguments);
     call.signature = signature;
     if (OptionalError error = writeWithinBounds(arguments, call)) return error;
-    return sendCall(std::move(call), identifier, method, std::move(lent), whenUnsent);
+    return sendCall(call, identifier, method, std::move(lent), whenUnsent);
 }
 
-OptionalError SocketConnection::sendCall(dbus::Message message, ReplyIdentifier identifier,
+OptionalError SocketConnection::sendCall(dbus::Message& message, ReplyIdentifier identifier,
                                          std::size_t method, LentSurfaces surfaces, ErrorReport whenUnsent) {
     std::unique_lock lock(outMutex_);
     // Looked at under the lock: what is queued or lent afterwards would not be found by `close`.
@@ -196,7 +196,7 @@ OptionalError SocketConnection::sendCall(dbus::Message message, ReplyIdentifier 
         out_.lent.emplace(message.serial, std::move(surfaces));
     }
     if (identifier != 0) out_.awaited[message.serial] = {identifier, method};
-    const bool isWithinBounds = push(std::move(message), identifier == 0 ? std::move(whenUnsent) : nullptr);
+    const bool isWithinBounds = push(message, identifier == 0 ? std::move(whenUnsent) : nullptr);
     lock.unlock();
     afterPush(isWithinBounds);
     // What was queued without wanting a reply is reported from the queue, should it stay there.
@@ -204,10 +204,10 @@ OptionalError SocketConnection::sendCall(dbus::Message message, ReplyIdentifier 
     return isReportedHere ? OptionalError(notConnected()) : std::nullopt;
 }
 
-void SocketConnection::sendMessage(dbus::Message message) {
+void SocketConnection::sendMessage(dbus::Message& message) {
     std::unique_lock lock(outMutex_);
     message.serial = nextSerial();
-    const bool isWithinBounds = push(std::move(message));
+    const bool isWithinBounds = push(message);
     lock.unlock();
     afterPush(isWithinBounds);
 }
@@ -219,11 +219,11 @@ std::uint32_t SocketConnection::nextSerial() {
 }
 
 /// Queues a message. False when that passes a bound; then nothing was queued.
-bool SocketConnection::push(dbus::Message message, ErrorReport whenUnsent) {
+bool SocketConnection::push(dbus::Message& message, ErrorReport whenUnsent) {
     return push({dbus::serialize(message), 0, std::move(message.sentDescriptors), std::move(whenUnsent)});
 }
 
-bool SocketConnection::push(Outgoing outgoing) {
+bool SocketConnection::push(Outgoing&& outgoing) {
     if (out_.unsentBytes + outgoing.bytes.size() > ipc_bounds::kMostUnsentBytes ||
         out_.unsentDescriptors + outgoing.descriptors.size() > ipc_bounds::kMostUnsentDescriptors)
         return false;

@@ -30,7 +30,10 @@ std::shared_ptr<void> SocketConnection::answerAtTheEnd(std::uint32_t serial) {
 
 /// Only a client is sent one frame after the other; a server's peer may wait for this very answer.
 void SocketConnection::letGo(std::uint32_t serial) {
-    if (side_ == Side::server) return sendMessage(dbus::Message::replying(dbus::MessageType::reply, serial));
+    if (side_ == Side::server) {
+        dbus::Message reply = dbus::Message::replying(dbus::MessageType::reply, serial);
+        return sendMessage(reply);
+    }
     const Moment now = loop_->now();
     std::unique_lock lock(outMutex_);
     if (!out_.returns.letGo(serial, now)) {

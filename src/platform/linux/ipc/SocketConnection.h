@@ -98,13 +98,14 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     IPCReply replyTo(std::uint32_t serial, const IPCMethod& method);
     void answer(const dbus::Message& call, const std::string& signature, const Array& values);
     void answerError(const dbus::Message& call, const char* name, const std::string& text);
-    void sendMessage(dbus::Message message);
-    OptionalError sendCall(dbus::Message message, ReplyIdentifier identifier, std::size_t method,
+    // A message that is sent gets its serial and gives its descriptors away.
+    void sendMessage(dbus::Message& message);
+    OptionalError sendCall(dbus::Message& message, ReplyIdentifier identifier, std::size_t method,
                            LentSurfaces surfaces, ErrorReport whenUnsent);
     // All under `outMutex_`.
     std::uint32_t nextSerial();
-    bool push(dbus::Message message, ErrorReport whenUnsent = nullptr);
-    bool push(Outgoing outgoing);
+    bool push(dbus::Message& message, ErrorReport whenUnsent = nullptr);
+    bool push(Outgoing&& outgoing);
     bool pushReturns();
     static std::vector<ErrorReport> reportsOf(std::deque<Outgoing> unsent);
     void dropUnsent(SentDescriptors& gone);
