@@ -57,7 +57,8 @@ class Library {
             if (error->code() == EPERM) {
                 return program_.fail("the daemon does not take this program for the system shell", kRefused);
             }
-            if (error->code() == EBUSY) return program_.fail("somebody else recovers movies now", kRefused);
+            if (error->code() == EBUSY && program_.line().isRecovery)
+                return program_.fail("somebody else recovers movies now", kRefused);
             program_.fail(*error);
         });
     }

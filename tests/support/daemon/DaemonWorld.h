@@ -60,10 +60,9 @@ class DaemonWorld {
     }
 
     /// The paths of the movies that were saved, and of those that lie in the store.
-    std::vector<std::string> library() const {
-        return movies(root() + "/private/var/mobile/Media/Videos/Screen Recordings");
-    }
+    std::vector<std::string> library() const { return movies(libraryPath()); }
     std::vector<std::string> store() const { return movies(storePath()); }
+    std::string libraryPath() const { return root() + "/private/var/mobile/Media/Videos/Screen Recordings"; }
     std::string storePath() const { return root() + "/private/var/mobile/Library/KelvoKit"; }
 
   private:

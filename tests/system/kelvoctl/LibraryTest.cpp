@@ -1,9 +1,13 @@
 #include "KelvoctlProcess.h"
+#include "base/UniqueFd.h"
 #include "support/daemon/DaemonWorld.h"
 #include "support/media/MovieProbe.h"
 
 #include <csignal>
+#include <fcntl.h>
 #include <filesystem>
+#include <fstream>
+#include <sys/file.h>
 #include <thread>
 
 #include <gtest/gtest.h>
@@ -80,6 +84,28 @@ TEST_F(LibraryCommandTest, MovieOfADaemonThatWasKilledIsRecovered) {
     EXPECT_EQ(test::probeStream(movie, "a:0", "codec_name"), "aac");
     EXPECT_EQ(test::probeStream(movie, "a:1", "codec_name"), "");  // mixed
     EXPECT_EQ(run({"library", "recover"}), Answer(0, "there is nothing to recover\n"));
+}
+
+TEST_F(LibraryCommandTest, RecordingIsKeptWhileAnotherProgramHoldsTheLibrary) {
+    std::filesystem::create_directories(world.libraryPath());
+    std::ofstream(world.libraryPath() + "/.library.sqlite").close();
+    UniqueFd holder(::open(world.libraryPath().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    ASSERT_EQ(::flock(holder.get(), LOCK_EX), 0);
+    KelvoctlProcess recording(world.socket(), {"record", "--seconds", "1"}, KELVOCTL_PROGRAM,
+                              world.display());
+    EXPECT_EQ(recording.waitForEnd(), 0) << recording.output() << world.log();
+    EXPECT_TRUE(world.waitForLog("the new recording comes in when that ends"));
+    EXPECT_EQ(run({"library"}),
+              Answer(1, "kelvoctl: " + world.libraryPath() +
+                            ": another program is using the library of recordings and does not let go of it"
+                            " (KVPOSIXErrorDomain 16)\n"));
+    holder = UniqueFd();
+    const auto [status, text] = run({"library"});
+    EXPECT_EQ(status, 0);
+    EXPECT_NE(text.find(world.libraryPath() + "/Screen Recording "), std::string::npos) << text;
+    ASSERT_EQ(world.library().size(), 1U);
+    EXPECT_EQ(test::decodingComplaints(world.library().front()), "");
+    EXPECT_TRUE(world.store().empty());
 }
 
 TEST_F(LibraryCommandTest, ProgramOutsideOfTheBundleIsRefused) {

@@ -13,8 +13,12 @@ class MovieLibrary::Access {
     /// Whether a library was ever begun in `folder`.
     static bool hasLibrary(const std::string& folder);
 
-    /// Waits for the others, and clears away what they left. Begins a library where there is none.
-    static Result<Access> begin(const std::string& folder);
+    /// Waits for the others, and clears away what they left. Begins a library where there is none. EBUSY when
+    /// the others take longer than `patience`.
+    static Result<Access> begin(const std::string& folder, std::chrono::milliseconds patience);
+
+    /// Puts the content of `source` into a library that somebody else holds, for whoever begins next to add.
+    static OptionalError leave(const std::string& folder, const UniqueFd& source, const LibraryEntry& entry);
 
     /// Adds the content of `source`; see `MovieLibrary::add`.
     OptionalError add(const UniqueFd& source, LibraryEntry entry);
@@ -27,10 +31,13 @@ class MovieLibrary::Access {
 
     OptionalError recover();
     OptionalError finish(LibraryEntry entry);
-    OptionalError place(LibraryEntry& entry);
+    OptionalError place(LibraryEntry& entry, const std::string& from);
+    OptionalError takeInWhatWaits();
+    OptionalError takeIn(const std::string& name);
     OptionalError sweepStagedFiles();
     OptionalError syncFolder() const;
-    std::string stagingPath(const LibraryEntry& entry) const;
+    std::string stagingPath(const LibraryEntry& entry) const { return stagingPath(folder_, entry); }
+    static std::string stagingPath(const std::string& folder, const LibraryEntry& entry);
     std::string path(const LibraryEntry& entry) const { return folder_ + "/" + entry.fileName; }
 
     std::string folder_;

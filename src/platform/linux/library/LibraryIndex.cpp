@@ -10,7 +10,6 @@ namespace {
 /// Tells the index apart from other SQLite files.
 constexpr std::int64_t kApplicationIdentifier = 0x6b656c76;
 constexpr std::int64_t kVersion = 1;
-constexpr int kBusyMilliseconds = 5000;
 
 constexpr const char* kSchema =
     "BEGIN IMMEDIATE;"
@@ -40,6 +39,13 @@ std::optional<LibraryEntry> entryOf(sqlite3_stmt* row) {
 
 }  // namespace
 
+KVError heldByAnother(const std::string& path) {
+    return {std::string(kPOSIXErrorDomain),
+            EBUSY,
+            {{std::string(kLocalizedDescriptionKey),
+              path + ": another program is using the library of recordings and does not let go of it"}}};
+}
+
 bool isLibraryIdentifier(std::string_view text) {
     constexpr std::size_t kLength = 36;
     return text.size() == kLength && text.find_first_not_of("0123456789ABCDEF-") == std::string_view::npos;
@@ -55,7 +61,7 @@ void LibraryIndex::Finalize::operator()(sqlite3_stmt* statement) const {
 
 LibraryIndex::~LibraryIndex() = default;
 
-Result<LibraryIndex> LibraryIndex::open(const std::string& hostPath) {
+Result<LibraryIndex> LibraryIndex::open(const std::string& hostPath, std::chrono::milliseconds patience) {
     sqlite3* database = nullptr;
     constexpr int kFlags =
         SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE | SQLITE_OPEN_NOFOLLOW | SQLITE_OPEN_EXRESCODE;
@@ -63,12 +69,12 @@ Result<LibraryIndex> LibraryIndex::open(const std::string& hostPath) {
     LibraryIndex index(database, hostPath);
     if (database == nullptr) return KVError::posix(ENOMEM, hostPath);
     if (code != SQLITE_OK) return index.failure();
-    if (const OptionalError error = index.prepareFile()) return *error;
+    if (const OptionalError error = index.prepareFile(patience)) return *error;
     return index;
 }
 
-OptionalError LibraryIndex::prepareFile() {
-    sqlite3_busy_timeout(database_.get(), kBusyMilliseconds);
+OptionalError LibraryIndex::prepareFile(std::chrono::milliseconds patience) {
+    sqlite3_busy_timeout(database_.get(), static_cast<int>(patience.count()));
     // What a damaged or foreign file says is data, and never instructions.
     sqlite3_db_config(database_.get(), SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
     sqlite3_db_config(database_.get(), SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
@@ -166,7 +172,7 @@ KVError LibraryIndex::failure() const {
         case SQLITE_PERM:
             return KVError::posix(EROFS, path_);
         case SQLITE_BUSY:
-            return KVError::posix(EBUSY, path_);
+            return heldByAnother(path_);
         default:
             break;
     }

@@ -3,6 +3,7 @@
 #include "base/Date.h"
 #include "base/Result.h"
 
+#include <chrono>
 #include <memory>
 #include <optional>
 #include <string>
@@ -36,8 +37,9 @@ struct LibraryEntry {
 class LibraryIndex {
   public:
     /// Opens the index at a host path, making it if it is not there. Fails, leaving the file as it is, when
-    /// it cannot be read or is not the index of a library.
-    static Result<LibraryIndex> open(const std::string& hostPath);
+    /// it cannot be read or is not the index of a library. This and every operation fail with EBUSY when
+    /// another program keeps the index locked for longer than `patience`.
+    static Result<LibraryIndex> open(const std::string& hostPath, std::chrono::milliseconds patience);
 
     LibraryIndex(LibraryIndex&&) noexcept = default;
     ~LibraryIndex();
@@ -60,7 +62,7 @@ class LibraryIndex {
     using Statement = std::unique_ptr<sqlite3_stmt, Finalize>;
 
     LibraryIndex(sqlite3* database, std::string path) : database_(database), path_(std::move(path)) {}
-    OptionalError prepareFile();
+    OptionalError prepareFile(std::chrono::milliseconds patience);
     Result<std::int64_t> number(const char* sql);
     OptionalError execute(const char* sql);
     OptionalError run(const char* sql, std::initializer_list<std::string_view> texts,
@@ -71,6 +73,9 @@ class LibraryIndex {
     std::unique_ptr<sqlite3, Close> database_;
     std::string path_;
 };
+
+/// The error (EBUSY) of whoever waited in vain for another program that holds the file or folder at `path`.
+KVError heldByAnother(const std::string& path);
 
 /// Whether `text` is an identifier as the library makes them.
 bool isLibraryIdentifier(std::string_view text);

@@ -1,5 +1,6 @@
 #include "platform/linux/library/MovieLibrary.h"
 
+#include "base/KVLog.h"
 #include "base/UUID.h"
 #include "platform/linux/files/WritableDirectory.h"
 #include "platform/linux/library/LibraryAccess.h"
@@ -52,20 +53,28 @@ Result<std::string> MovieLibrary::add(const std::string& moviePath) {
     if (!source || ::fstat(source.get(), &status) != 0) return KVError::posix(errno, moviePath);
     if (!S_ISREG(status.st_mode)) return KVError::posix(EINVAL, moviePath);
     if (const OptionalError error = makeFolder(folder_)) return *error;
-    auto access = Access::begin(folder_);
-    if (!access) return access.error();
     LibraryEntry entry;
     entry.identifier = newIdentifier(*random_);
     entry.creationDate = {status.st_mtim.tv_sec * 1000000000LL + status.st_mtim.tv_nsec};
     entry.fileName = localTimeText(entry.creationDate, "Screen Recording %Y-%m-%d at %H.%M.%S") +
                      fs::path(moviePath).extension().string();
-    if (const OptionalError error = access->add(source, entry)) return *error;
+    const std::lock_guard lock(mutex_);
+    if (const OptionalError error = addOrLeave(source, entry)) return *error;
     return entry.identifier;
+}
+
+OptionalError MovieLibrary::addOrLeave(const UniqueFd& source, const LibraryEntry& entry) {
+    auto access = Access::begin(folder_, patience_);
+    const OptionalError error = access ? access->add(source, entry) : access.error();
+    if (!error || error->code() != EBUSY) return error;
+    KVLogError("%s; the new recording comes in when that ends", error->localizedDescription().c_str());
+    return Access::leave(folder_, source, entry);
 }
 
 OptionalError MovieLibrary::remove(std::string_view identifier) {
     if (!Access::hasLibrary(folder_)) return KVError::posix(ENOENT, identifier);
-    auto access = Access::begin(folder_);
+    const std::lock_guard lock(mutex_);
+    auto access = Access::begin(folder_, patience_);
     if (!access) return access.error();
     const auto entry = access->index().find(identifier);
     if (!entry) return entry.error();
@@ -74,7 +83,8 @@ OptionalError MovieLibrary::remove(std::string_view identifier) {
 
 Result<std::vector<LibraryMovie>> MovieLibrary::movies() {
     if (!Access::hasLibrary(folder_)) return std::vector<LibraryMovie>();
-    auto access = Access::begin(folder_);
+    const std::lock_guard lock(mutex_);
+    auto access = Access::begin(folder_, patience_);
     if (!access) return access.error();
     const auto entries = access->index().entries();
     if (!entries) return entries.error();
@@ -90,7 +100,8 @@ Result<std::vector<LibraryMovie>> MovieLibrary::movies() {
 
 OptionalError MovieLibrary::recover() {
     if (!Access::hasLibrary(folder_)) return std::nullopt;
-    return Access::begin(folder_).optionalError();
+    const std::lock_guard lock(mutex_);
+    return Access::begin(folder_, patience_).optionalError();
 }
 
 }  // namespace kelvo
