@@ -1,6 +1,7 @@
 #include "tools/kelvoctl/Program.h"
 
 #include "ipc/KVClientProtocolTable.h"
+#include "ipc/KVUserErrors.h"
 #include "tools/kelvoctl/Commands.h"
 #include "tools/kelvoctl/DaemonSocket.h"
 #include "tools/kelvoctl/JsonText.h"
@@ -9,6 +10,21 @@
 #include <cstdio>
 
 namespace kelvo::ctl {
+namespace {
+
+/// The daemon's own words for it do not say that it was started where there is no display.
+constexpr const char* kNoDisplayHint =
+    "the daemon has no display, or lost it. Where systemd runs it: `systemctl --user import-environment "
+    "DISPLAY "
+    "XAUTHORITY`, then `systemctl --user restart kelvod`; else start it where DISPLAY is set. Its log says "
+    "what "
+    "is missing.";
+
+bool isAboutTheDisplay(const KVError& error) {
+    return error.domain() == KVRecordingErrorDomain && error.code() == kRecordingErrorMediaServicesFailed;
+}
+
+}  // namespace
 
 Program::~Program() {
     if (!connection_) return;
@@ -95,6 +111,7 @@ void Program::fail(const KVError& error) {
         const std::string text = error.localizedDescription();
         std::fprintf(stderr, "kelvoctl: %s (%s %lld)\n", text.empty() ? "the daemon refused" : text.c_str(),
                      error.domain().c_str(), static_cast<long long>(error.code()));
+        if (isAboutTheDisplay(error)) remark(kNoDisplayHint);
     }
     finish(kRefused);
 }

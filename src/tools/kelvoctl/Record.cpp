@@ -72,6 +72,7 @@ class Recording {
         if (program_.line().isJson)
             program_.answer("", Dictionary{{"recording", true}, {"microphone", microphone}});
         program_.remark("recording; Ctrl-C stops and saves");
+        if (endBeforeAnswer_) return ended(*endBeforeAnswer_);
         if (isStopWanted_) return stop();
         if (::isatty(STDERR_FILENO) == 1 && !program_.line().isJson) {
             showTimer();
@@ -115,20 +116,28 @@ class Recording {
 
     /// The daemon ends recordings of its own accord, too, and saves them itself then.
     void told(const std::string& name, const Dictionary& arguments) {
-        if (phase_ != Phase::running) return;
         if (name == "recordingDidStopWithError" || name == "recordingLockInterrupted") {
-            const KVError* const error = arguments.find("error")->asError();
-            if (error == nullptr) return stoppedElsewhere();
-            hideTimer();
-            program_.fail(*error);
-            program_.remark(
-                "`kelvoctl library` tells what was saved; once the daemon starts anew, `library recover` "
-                "saves the rest");
+            const Value* const error = arguments.find("error");
+            // It may have ended before the answer to its start is here.
+            if (phase_ == Phase::starting) endBeforeAnswer_ = *error;
+            if (phase_ == Phase::running) ended(*error);
+            return;
         }
+        if (phase_ != Phase::running) return;
         if (name != "updateScreenRecordingState") return;
         program_.daemon().synchronousGetCurrentState(program_.onMain([this](const auto& state) {
             if (phase_ == Phase::running && !isRecording(state)) stoppedElsewhere();
         }));
+    }
+
+    void ended(const Value& reason) {
+        const KVError* const error = reason.asError();
+        if (error == nullptr) return stoppedElsewhere();
+        hideTimer();
+        program_.fail(*error);
+        program_.remark(
+            "`kelvoctl library` tells what was saved; once the daemon starts anew, `library recover` "
+            "saves the rest");
     }
 
     void stoppedElsewhere() {
@@ -140,6 +149,7 @@ class Recording {
     Program& program_;
     Phase phase_ = Phase::before;
     bool isStopWanted_ = false;
+    std::optional<Value> endBeforeAnswer_;
     std::chrono::nanoseconds startedAt_{0};
     std::shared_ptr<RepeatingTimer> timer_;
     std::shared_ptr<RepeatingTimer> end_;

@@ -84,6 +84,20 @@ TEST_F(KelvoctlWithDaemonTest, OutputThatExistsIsRefusedBeforeAnythingIsRecorded
               Answer(2, "kelvoctl: " + path + ": File exists\n"));
 }
 
+TEST_F(KelvoctlWithDaemonTest, DaemonWithoutADisplayTellsWhatIsMissingAndKelvoctlWhatToDo) {
+    const auto [status, text] = KelvoctlProcess::run(socket, {"record"});
+    EXPECT_EQ(status, 1);
+    EXPECT_NE(text.find("KVRecordingErrorDomain -5817)\nthe daemon has no display, or lost it."),
+              std::string::npos)
+        << text;
+    EXPECT_NE(text.find("`systemctl --user import-environment DISPLAY XAUTHORITY`"), std::string::npos);
+    EXPECT_TRUE(daemon.waitForLine(
+        "cannot record the screen: there is no display, as DISPLAY is not set for the daemon"))
+        << daemon.output();
+    EXPECT_TRUE(daemon.waitForLine(
+        "there is no display, as DISPLAY is not set for the daemon; what it shows is unknown"));
+}
+
 TEST_F(KelvoctlWithDaemonTest, OneShellAtATimeShowsAlerts) {
     KelvoctlProcess first(socket, {"shell", "--answer", "other"});
     ASSERT_TRUE(first.waitForLine("showing alerts")) << first.output();

@@ -10,6 +10,7 @@
 
 #include <atomic>
 #include <fstream>
+#include <functional>
 #include <iterator>
 #include <memory>
 #include <string>
@@ -36,6 +37,7 @@ class ScriptedDaemon : public FakeDaemon {
                                                         cameraEnabled, broadcast, systemRecording,
                                                         captureEnabled, listenerEndpoint, nullptr);
         isRecording = !startError.copy();
+        if (const auto act = beforeStartIsAnswered.copy()) act();
         handler(startError.copy(), microphoneEnabled, false);
     }
     void stopRecordingWithHandler(MovieHandler handler) override {
@@ -55,6 +57,7 @@ class ScriptedDaemon : public FakeDaemon {
 
     std::atomic<bool> isRecording{false};
     std::atomic<bool> staysSilent{false};
+    Guarded<std::function<void()>> beforeStartIsAnswered;
     Guarded<OptionalError> startError;
     Guarded<OptionalError> stopError;
     Guarded<OptionalError> saveError;

@@ -122,6 +122,16 @@ TEST_F(KelvoctlRecordingTest, RecordingThatTheSystemEndsIsToldWithItsReason) {
         << record.output();
 }
 
+TEST_F(KelvoctlRecordingTest, RecordingThatEndsBeforeItsStartIsAnsweredIsTold) {
+    const KVError error("domain", -5817, {{std::string(kLocalizedDescriptionKey), "no screen"}});
+    daemon->beforeStartIsAnswered.set([&] { client().recordingDidStopWithError(error, std::nullopt); });
+    KelvoctlProcess record(socket, {"record"});
+    EXPECT_EQ(record.waitForExit(), 1);
+    EXPECT_NE(record.output().find("kelvoctl: no screen (domain -5817)\n"), std::string::npos)
+        << record.output();
+    EXPECT_EQ(record.output().find("the daemon has no display"), std::string::npos);
+}
+
 TEST_F(KelvoctlRecordingTest, RecordingThatTheDeviceLockEndsIsToldWithItsReason) {
     KelvoctlProcess record(socket, {"record"});
     ASSERT_TRUE(record.waitForLine("recording;"));

@@ -1,7 +1,9 @@
 #include "platform/linux/x11/CaptureLoop.h"
 
+#include "base/KVLog.h"
 #include "platform/linux/x11/RootPicture.h"
 #include "platform/linux/x11/WindowsPicture.h"
+#include "platform/linux/x11/XHandshake.h"
 
 #include <algorithm>
 #include <array>
@@ -55,13 +57,22 @@ std::optional<ScreenCaptureStatus> CaptureLoop::run() {
 /// happened.
 bool CaptureLoop::begin() {
     connection_ = XConnection::open(settings_.display, stopEvent_.descriptor());
-    if (!connection_ || !connection_->drawsBGRx() || !hasExtensions()) return false;
+    if (!connection_) return cannotCapture(unreachableText(displayName(settings_.display)));
+    if (!connection_->drawsBGRx())
+        return cannotCapture("the display's pixels are not of 32 bits, blue first");
+    if (!hasExtensions()) return cannotCapture("the display lacks MIT-SHM 1.2, DAMAGE or XFIXES");
     picture_ = makePicture(settings_.mirroring->current());
     if (picture_ && !picture_->watch()) return false;
     firstChange_.reset();
     isArmed_ = false;
     if (picture_) firstChange_ = lastChange_ = monotonicNow();
     return !connection_->isBroken();
+}
+
+/// Whoever is told of the failure learns no more than that there is one.
+bool CaptureLoop::cannotCapture(const std::string& reason) const {
+    if (!stopped_) KVLogError("cannot record the screen: %s", reason.c_str());
+    return false;
 }
 
 bool CaptureLoop::hasExtensions() {

@@ -46,6 +46,7 @@ class CaptureLoop {
 
     bool begin();
     bool hasExtensions();
+    bool cannotCapture(const std::string& reason) const;
     std::unique_ptr<XPicture> makePicture(const Mirroring& mirroring);
     std::optional<ScreenCaptureStatus> watchPicture();
     void takeEvents(Time now, unsigned subtracted = 0);

@@ -2,6 +2,7 @@
 
 #include "base/KVLog.h"
 #include "base/ThreadName.h"
+#include "platform/linux/x11/XHandshake.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -74,7 +75,8 @@ void DesktopWatch::watch(const Handler& handler) {
         if (!connect()) {
             if (!wait(0)) return;
             if (std::exchange(isReachable, false))
-                KVLogError("cannot reach the display; what it shows is unknown until it is there");
+                KVLogError("%s; what it shows is unknown until it is there",
+                           unreachableText(displayName(display_)).c_str());
             report({}, handler);
             if (!wait(kRetryMilliseconds)) return;
             continue;

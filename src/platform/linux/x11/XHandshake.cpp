@@ -127,6 +127,19 @@ std::optional<int> serverNumber(const std::string& display, int& screen) {
 
 }  // namespace
 
+std::string displayName(const std::string& display) {
+    if (!display.empty()) return display;
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): nothing changes the environment once threads run
+    const char* const named = std::getenv("DISPLAY");
+    return named != nullptr ? named : "";
+}
+
+std::string unreachableText(const std::string& displayName) {
+    if (displayName.empty()) return "there is no display, as DISPLAY is not set for the daemon";
+    return "cannot reach the display " + displayName +
+           ", which must run on this machine and take whoever has the cookie in XAUTHORITY";
+}
+
 xcb_connection_t* connectTo(const std::string& display, int& screen, int interruptFd,
                             std::optional<std::chrono::milliseconds> limit) {
     const auto number = serverNumber(display, screen);

@@ -14,4 +14,10 @@ namespace kelvo::x11 {
 xcb_connection_t* connectTo(const std::string& display, int& screen, int interruptFd,
                             std::optional<std::chrono::milliseconds> limit);
 
+/// `display`, or what $DISPLAY names when it is empty; empty when nothing does.
+std::string displayName(const std::string& display);
+
+/// What a log says of a display of that name which cannot be reached. Any thread.
+std::string unreachableText(const std::string& displayName);
+
 }  // namespace kelvo::x11

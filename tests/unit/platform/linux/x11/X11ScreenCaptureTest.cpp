@@ -1,6 +1,7 @@
 #include "platform/linux/x11/X11Screen.h"
 #include "support/Eventually.h"
 #include "support/FrameRecorder.h"
+#include "support/LogRecorder.h"
 #include "support/x11/XClient.h"
 #include "support/x11/XvfbServer.h"
 
@@ -62,7 +63,8 @@ TEST_F(X11ScreenCaptureTest, CursorIsBlendedInAndItsMoveAloneYieldsAFrame) {
     EXPECT_GT(differentPixels(*before, *recorder_->lastSurface()), 10);
 }
 
-TEST_F(X11ScreenCaptureTest, UnreachableDisplayIsReported) {
+TEST_F(X11ScreenCaptureTest, UnreachableDisplayIsReportedAndNamedInTheLog) {
+    const test::LogRecorder log;
     X11Screen nowhere(":4711");
     nowhere.setMode(MirroringMode::wholeScreen);
     const auto source = nowhere.createSource({100, 100}, MediaTime::make(1, 60));
@@ -70,6 +72,9 @@ TEST_F(X11ScreenCaptureTest, UnreachableDisplayIsReported) {
     source->startCapture();
     EXPECT_TRUE(
         eventually([&] { return recorder_->failures() == std::vector{ScreenCaptureStatus::unreachable}; }));
+    EXPECT_TRUE(
+        log.contains("cannot record the screen: cannot reach the display :4711, which must run on this "
+                     "machine and take whoever has the cookie in XAUTHORITY"));
 }
 
 TEST_F(X11ScreenCaptureTest, SourceCanBeStartedAgainAfterTheDisplayCameBack) {
