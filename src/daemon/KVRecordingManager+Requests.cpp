@@ -40,7 +40,22 @@ void KVRecordingManager::stopRecordingWithStartClipDuration(double startClipDura
     // Without a handler the movie is thrown away: such a stop has to stay without one.
     sessionManager_->stopRecordingSession(getCallingConnectionRecordingSession(), startClipDuration,
                                           endClipDuration,
-                                          handler ? endingWork(std::move(handler)) : nullptr);
+                                          handler ? handingOver(endingWork(std::move(handler))) : nullptr);
+}
+
+/// `handler`, after the movie that it gets is noted as the calling client's.
+MovieHandler KVRecordingManager::handingOver(MovieHandler handler) {
+    return [weakSelf = weak_from_this(), process = callingProcess(), handler = std::move(handler)](
+               const std::optional<URL>& movieURL, const OptionalError& error) {
+        const auto self = weakSelf.lock();
+        if (self && movieURL) self->moviesInUse_.handTo(process, *movieURL);
+        handler(movieURL, error);
+    };
+}
+
+std::int32_t KVRecordingManager::callingProcess() const {
+    const auto connection = connectionManager_->getCurrentConnection();
+    return connection ? connection->processIdentifier() : 0;
 }
 
 void KVRecordingManager::saveVideoToCameraRoll(const URL& movieURL, ErrorHandler handler) {
@@ -50,6 +65,7 @@ void KVRecordingManager::saveVideoToCameraRoll(const URL& movieURL, ErrorHandler
         return;
     }
     saveVideoToCameraRoll(std::optional(movieURL), std::move(handler));
+    moviesInUse_.takeFrom(callingProcess());  // the save holds it itself
 }
 
 /// A saved movie is deleted: what is not the daemon's own, or is still being recorded, must not come to that.
@@ -59,6 +75,11 @@ bool KVRecordingManager::mayCallerSave(const URL& movieURL) const {
     if (isBeingWritten(movieURL)) return false;
     const SessionRef session = getCallingConnectionRecordingSession();
     return clientHasSystemEntitlements() || (session && session->ownsMovie(movieURL));
+}
+
+bool KVRecordingManager::isMovieInUse(const std::string& name) const {
+    return moviesInUse_.contains(name) ||
+           isBeingWritten(URL::file(KVTemporaryFileStore::_srTempPath() + "/" + name));
 }
 
 bool KVRecordingManager::isBeingWritten(const URL& movieURL) const {
@@ -111,6 +132,7 @@ void KVRecordingManager::updateProcessIDForAudioCaptureWithPID(std::int32_t proc
 
 void KVRecordingManager::discardRecordingWithHandler(DoneHandler handler) {
     KVLog("KVRecordingManager: discardRecording");
+    moviesInUse_.takeFrom(callingProcess());
     const SessionRef session = getCallingConnectionRecordingSession();
     if (!session) {
         if (handler) handler();  // there is nothing to discard
@@ -171,6 +193,7 @@ void KVRecordingManager::reportCameraUsage(std::int32_t) {
 
 void KVRecordingManager::connectionManagerDidAcceptNewConnection(
     const IPCConnectionRef& connection, const std::optional<std::string>& bundleIdentifier) {
+    moviesInUse_.clientCame(connection->processIdentifier());
     const SessionRef session =
         sessionManager_->recordingSessionInstanceWithBundleIdentifier(bundleIdentifier.value_or(""));
     // A proxy that nobody holds would end the connection of a peer that is welcome.
@@ -181,6 +204,7 @@ void KVRecordingManager::connectionManagerDidAcceptNewConnection(
 void KVRecordingManager::applicationDisconnectedWithBundleID(
     const std::optional<std::string>& bundleIdentifier, std::int32_t processIdentifier) {
     KVLog("KVRecordingManager: applicationDisconnected");
+    moviesInUse_.clientWent(processIdentifier);
     sessionManager_->applicationDisconnectedWithBundleID(bundleIdentifier.value_or(""), processIdentifier);
     // What is gone comes neither to the foreground nor back.
     applicationStateMonitor_->removeObserverWithProcessIdentifier(processIdentifier);

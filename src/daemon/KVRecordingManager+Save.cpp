@@ -8,12 +8,20 @@ namespace kelvo {
 
 void KVRecordingManager::saveVideoToCameraRoll(const std::optional<URL>& movieURL, ErrorHandler completion) {
     KVLog("KVRecordingManager: saveVideoToCameraRoll:");
-    mixer_->mixAudioForMovie(
-        movieURL, [weakSelf = weak_from_this(), movieURL, completion = endingWork(std::move(completion))](
-                      const auto& mixedURL, const auto& error) {
-            if (error) KVLogError("Error Mixing video Audio tracks");
-            if (const auto self = weakSelf.lock()) self->saveFinishedMovie(movieURL, mixedURL, completion);
-        });
+    mixer_->mixAudioForMovie(movieURL, [weakSelf = weak_from_this(), movieURL,
+                                        completion = endingWork(holding(movieURL, std::move(completion)))](
+                                           const auto& mixedURL, const auto& error) {
+        if (error) KVLogError("Error Mixing video Audio tracks");
+        if (const auto self = weakSelf.lock()) self->saveFinishedMovie(movieURL, mixedURL, completion);
+    });
+}
+
+/// `completion`, which may be none, keeping the movie in use until it is dropped.
+ErrorHandler KVRecordingManager::holding(const std::optional<URL>& movieURL, ErrorHandler completion) {
+    return [hold = movieURL ? moviesInUse_.hold(*movieURL) : nullptr,
+            completion = std::move(completion)](const OptionalError& error) {
+        if (completion) completion(error);
+    };
 }
 
 /// Saves the mixed movie, or the unmixed one when there is no other, and leaves neither behind.

@@ -20,6 +20,7 @@ void KVRecordingManager::currentSessionStopped(const std::optional<URL>& movieUR
     applicationStateMonitor_->removeSystemObserver();
     statusBarAssertion_->invalidateDoubleHeightStatusBar();
     if (!movieURL) return;
+    const auto hold = moviesInUse_.hold(*movieURL);
     const auto asset = platform_.photoLibrary->createVideoAsset(*movieURL);
     if (!asset) {
         KVLog("KVRecordingManager:stopCurrentRecordingSession: Video saved to camera roll failed");

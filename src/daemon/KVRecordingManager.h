@@ -2,6 +2,7 @@
 
 #include "base/Guarded.h"
 #include "base/SerialQueue.h"
+#include "daemon/MoviesInUse.h"
 #include "daemon/StartRequest.h"
 #include "ipc/KVConnectionManager.h"
 #include "ipc/KVUserErrors.h"
@@ -81,6 +82,10 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
     /// Stops whatever records and saves the movie of a system recording; `handler` (may be none) never gets
     /// an error. Caller's thread, or where the stopped session finishes.
     void stopCurrentRecordingSessionWithHandler(ErrorHandler handler);
+
+    /// Whether the store's movie of that name is recorded now, saved now, or in the hands of a client that
+    /// has yet to say what becomes of it. Any thread.
+    bool isMovieInUse(const std::string& name) const;
 
     // Recording sessions' delegate.
     void recordingSessionStoppedWithError(const SessionRef& session, const OptionalError& error) override;
@@ -282,6 +287,9 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
     }
     void finishRecordings(const WorkRef& work);
     void finishRecording(const SessionRef& session, const WorkRef& work);
+    std::int32_t callingProcess() const;
+    ErrorHandler holding(const std::optional<URL>& movieURL, ErrorHandler completion);
+    MovieHandler handingOver(MovieHandler handler);
     bool mayCallerSave(const URL& movieURL) const;
     bool isBeingWritten(const URL& movieURL) const;
 
@@ -292,6 +300,7 @@ class KVRecordingManager : public KVConnectionManagerDelegate,
 
     const std::shared_ptr<KVAudioMixUtility> mixer_;
     Guarded<WorkRef> work_{std::make_shared<Work>()};
+    MoviesInUse moviesInUse_;
     std::shared_ptr<KVConnectionManager> connectionManager_;
     std::shared_ptr<IPCListener> publicListener_;
     std::shared_ptr<KVSessionManager> sessionManager_;

@@ -57,18 +57,21 @@ class LibraryService::Link : public KVLibraryProtocol {
     const std::weak_ptr<IPCConnection> connection_;
 };
 
-std::shared_ptr<LibraryService> LibraryService::create(const Platform& platform) {
-    std::shared_ptr<LibraryService> service(new LibraryService(platform));
+std::shared_ptr<LibraryService> LibraryService::create(const Platform& platform,
+                                                       MovieRecovery::InUse isInUse) {
+    std::shared_ptr<LibraryService> service(new LibraryService(platform, std::move(isInUse)));
     service->listener_->setDelegate(service);
     service->listener_->resume();
     return service;
 }
 
-LibraryService::LibraryService(const Platform& platform)
+LibraryService::LibraryService(const Platform& platform, MovieRecovery::InUse isInUse)
     : library_(platform.photoLibrary),
-      recovery_(std::make_shared<MovieRecovery>(
-          platform, std::make_shared<KVUserErrors>(
-                        std::make_shared<KVLocalization>(platform.bundles, platform.languages)))),
+      recovery_(
+          std::make_shared<MovieRecovery>(platform,
+                                          std::make_shared<KVUserErrors>(std::make_shared<KVLocalization>(
+                                              platform.bundles, platform.languages)),
+                                          std::move(isInUse))),
       listener_(platform.ipc->createListener(kLibraryServiceName)) {}
 
 bool LibraryService::listenerShouldAcceptNewConnection(IPCListener&, const IPCConnectionRef& connection) {

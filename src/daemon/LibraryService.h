@@ -12,14 +12,15 @@ namespace kelvo {
 class LibraryService : public IPCListenerDelegate, public std::enable_shared_from_this<LibraryService> {
   public:
     /// Listens at once.
-    static std::shared_ptr<LibraryService> create(const Platform& platform);
+    static std::shared_ptr<LibraryService> create(const Platform& platform,
+                                                  MovieRecovery::InUse isInUse = nullptr);
 
     bool listenerShouldAcceptNewConnection(IPCListener& listener,
                                            const IPCConnectionRef& connection) override;
 
   private:
     class Link;
-    explicit LibraryService(const Platform& platform);
+    LibraryService(const Platform& platform, MovieRecovery::InUse isInUse);
 
     const std::shared_ptr<PhotoLibrary> library_;
     const std::shared_ptr<MovieRecovery> recovery_;

@@ -11,20 +11,23 @@
 namespace kelvo {
 namespace {
 
+using namespace std::chrono_literals;
+
 constexpr std::string_view kMovieSuffix = ".mp4";
-constexpr std::string_view kTrimmedSuffix = "_trimmed.mp4";
+/// What a recording that ended by itself still had in its encoder is in the file by then.
+constexpr std::chrono::nanoseconds kLastWrite = 2s;
 
 std::string pathInStore(const std::string& name) {
     return KVTemporaryFileStore::_srTempPath() + "/" + name;
 }
 
-/// Whether `name` is what became, or was becoming, of another of those movies.
-bool isMadeFromAnother(const std::string& name, const std::map<std::string, FileAttributes>& all) {
-    // What mixing was making when the daemon ended: the movie that it was made from is there, too.
-    if (name.starts_with(KVTemporaryFileStore::kMixedMoviePrefix)) return true;
-    if (!name.ends_with(kTrimmedSuffix)) return false;
-    const std::string stem = name.substr(0, name.size() - kTrimmedSuffix.size());
-    return all.contains(stem + std::string(kMovieSuffix));
+bool isOfTheWholeScreen(const std::string& name) {
+    return name.starts_with(KVTemporaryFileStore::kScreenRecordingPrefix) && name.ends_with(kMovieSuffix);
+}
+
+/// What mixing was making when the daemon ended: the movie that it was made from is there, too.
+bool isMix(const std::string& name) {
+    return name.starts_with(KVTemporaryFileStore::kMixedMoviePrefix);
 }
 
 }  // namespace
@@ -35,17 +38,21 @@ struct MovieRecovery::Work {
     Handler handler;
 };
 
-MovieRecovery::MovieRecovery(const Platform& platform, const std::shared_ptr<KVUserErrors>& errors)
-    : platform_(platform), mixer_(platform.media, platform.clock, errors) {
+MovieRecovery::MovieRecovery(const Platform& platform, const std::shared_ptr<KVUserErrors>& errors,
+                             InUse isInUse)
+    : isInUse_(std::move(isInUse)), platform_(platform), mixer_(platform.media, platform.clock, errors) {
     std::map<std::string, FileAttributes> found;
+    std::size_t recordings = 0;
     const auto names = platform_.fileSystem->namesInDirectory(KVTemporaryFileStore::_srTempPath());
     for (const std::string& name : names.valueOr({})) {
         const auto file = platform_.fileSystem->attributesOfItem(pathInStore(name));
-        if (file && !file->isDirectory && name.ends_with(kMovieSuffix)) found.emplace(name, *file);
+        if (!file || file->isDirectory) continue;
+        found.emplace(name, *file);
+        recordings += isOfTheWholeScreen(name) ? 1 : 0;
     }
-    if (!found.empty()) {
+    if (recordings > 0) {
         KVLog("movies of an earlier run lie in the store: %zu; kelvoctl library recover saves them",
-              found.size());
+              recordings);
     }
     leftovers_.set(std::move(found));
 }
@@ -54,27 +61,31 @@ OptionalError MovieRecovery::recover(Handler handler) {
     if (isAtWork_.exchange(true)) return KVError::posix(EBUSY, "the recovery of movies");
     const auto work = std::make_shared<Work>();
     work->handler = std::move(handler);
-    const auto all = leftovers_.copy();
-    for (const auto& [name, file] : all) {
-        if (!isAsItWas(name)) continue;
-        if (isMadeFromAnother(name, all)) {
-            remove(pathInStore(name));
-        } else {
-            work->names.push_back(name);
-        }
+    const auto names = platform_.fileSystem->namesInDirectory(KVTemporaryFileStore::_srTempPath());
+    for (const std::string& name : names.valueOr({})) {
+        const auto file = platform_.fileSystem->attributesOfItem(pathInStore(name));
+        if (isMix(name) && file && isAsItWas(name, *file)) remove(pathInStore(name));
+        if (isForsaken(name)) work->names.push_back(name);
     }
+    std::ranges::sort(work->names);
     recoverNext(work);
     return std::nullopt;
 }
 
+/// Whether it is a recording of the whole screen that nobody of this run will save.
+bool MovieRecovery::isForsaken(const std::string& name) const {
+    const auto file = platform_.fileSystem->attributesOfItem(pathInStore(name));
+    if (!file || file->isDirectory || !isOfTheWholeScreen(name)) return false;
+    if (isInUse_ && isInUse_(name)) return false;
+    return isAsItWas(name, *file) || platform_.clock->now() - file->modificationDate > kLastWrite;
+}
+
 /// A recording of this run may have taken the name over.
-bool MovieRecovery::isAsItWas(const std::string& name) const {
-    const auto now = platform_.fileSystem->attributesOfItem(pathInStore(name));
-    if (!now) return false;
+bool MovieRecovery::isAsItWas(const std::string& name, const FileAttributes& now) const {
     return leftovers_.with([&](const auto& all) {
         const auto then = all.find(name);
-        return then != all.end() && then->second.modificationDate == now->modificationDate &&
-               then->second.size == now->size;
+        return then != all.end() && then->second.modificationDate == now.modificationDate &&
+               then->second.size == now.size;
     });
 }
 
@@ -99,6 +110,7 @@ void MovieRecovery::recoverNext(const WorkRef& work) {
         if (work->names.empty()) return self->finish(work);
         const std::string name = std::exchange(work->names.front(), {});
         work->names.pop_front();
+        if (!self->isForsaken(name)) return self->recoverNext(work);  // it was taken up meanwhile
         if (self->isSavedAlready(name) || !self->isPlayable(name)) {
             KVLog("nothing to save in %s", name.c_str());
             self->remove(pathInStore(name));
@@ -118,7 +130,7 @@ void MovieRecovery::save(const WorkRef& work, const std::string& name, const std
         platform_.photoLibrary->createVideoAsset(mixedURL.value_or(URL::file(pathInStore(name))));
     Dictionary result{{"name", name}};
     if (asset) {
-        KVLog("saved %s of an earlier run", name.c_str());
+        KVLog("saved %s, which nobody had saved", name.c_str());
         result.set("identifier", asset->localIdentifier);
         for (const PhotoAssetDetails& each : platform_.photoLibrary->assets().valueOr({})) {
             if (each.asset == *asset) result.set("path", each.hostPath);

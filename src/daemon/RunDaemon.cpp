@@ -20,7 +20,11 @@ int runDaemon(const Platform& platform, SessionFactory createSession, const std:
     const auto manager = KVRecordingManager::create(platform, std::move(createSession));
     theRecordingManager.set(manager);
     // Before the first client, who might fill the store.
-    const auto library = LibraryService::create(platform);
+    const auto library =
+        LibraryService::create(platform, [weakManager = std::weak_ptr(manager)](const std::string& name) {
+            const auto current = weakManager.lock();
+            return current && current->isMovieInUse(name);
+        });
     manager->finishStartup();
     if (ready) ready();
     platform.mainQueue->run();

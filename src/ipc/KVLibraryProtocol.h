@@ -22,10 +22,10 @@ class KVLibraryProtocol {
     /// The library's movies, oldest first: "identifier", "path" (on this machine), "creationDate", "size".
     virtual void listMovies(MoviesHandler handler) = 0;
 
-    /// Saves what an earlier run of the daemon left in its store to the library, and cleans it from the
-    /// store; one call at a time (EBUSY). Each movie is told by its "name" in the store, and with
-    /// "identifier" and "path" where it is saved now, or with "error" why it is not. One that could not be
-    /// saved stays in the store; one in which there is nothing to play goes.
+    /// Saves the recordings of the whole screen that lie in the daemon's store with nobody to save them to
+    /// the library, and cleans them from the store; one call at a time (EBUSY). Each movie is told by its
+    /// "name" in the store, and with "identifier" and "path" where it is saved now, or with "error" why it is
+    /// not. One that could not be saved stays in the store; one in which there is nothing to play goes.
     virtual void recoverMovies(MoviesHandler handler) = 0;
 };
 
@@ -41,7 +41,7 @@ struct ProtocolTable<KVLibraryProtocol> {
              Named{"error", "why it cannot be told"}}},
         Message<&P::recoverMovies>{
             {"recoverMovies",
-             "Save what an earlier run left in the store. Needs the right com.quillon.private.kelvo-kit."},
+             "Save what was left unsaved in the store. Needs the right com.quillon.private.kelvo-kit."},
             {},
             {Named{"movies", "each with its name in the store, and with identifier and path, or error"},
              Named{"error", "why nothing was tried"}}},

@@ -31,7 +31,8 @@ std::string KVRecordingSession::outputPath() const {
                ".mp4";
     }
     if (systemRecording_)
-        return directory + "ScreenRecording_" + localTimeText(now, "%m-%d-%Y %H-%M-%S") + ".mp4";
+        return directory + std::string(KVTemporaryFileStore::kScreenRecordingPrefix) +
+               localTimeText(now, "%m-%d-%Y %H-%M-%S") + ".mp4";
     return directory + localizedAppName() + ".mp4";
 }
 

@@ -27,6 +27,9 @@ class KVTemporaryFileStore {
     /// The store's path, with its trailing slash. A file's path is this, another slash and its name.
     static std::string _srTempPath();
 
+    /// How the names of the whole screen's recordings begin.
+    static constexpr std::string_view kScreenRecordingPrefix = "ScreenRecording_";
+
     /// How the names of mixed movies begin.
     static constexpr std::string_view kMixedMoviePrefix = "KVKelvo_Final";
 

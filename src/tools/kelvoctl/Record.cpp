@@ -136,8 +136,7 @@ class Recording {
         hideTimer();
         program_.fail(*error);
         program_.remark(
-            "`kelvoctl library` tells what was saved; once the daemon starts anew, `library recover` "
-            "saves the rest");
+            "`kelvoctl library` tells what was saved, and `kelvoctl library recover` saves the rest");
     }
 
     void stoppedElsewhere() {

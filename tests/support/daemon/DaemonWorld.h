@@ -34,6 +34,7 @@ class DaemonWorld {
     const std::string& root() const { return root_.path(); }
     const std::string& socket() const { return socket_; }
     const std::string& display() const { return screen_.display(); }
+    void loseScreen() { screen_.kill(); }
     SoundServer& sound() { return sound_; }
     ChildProcess& daemon() { return *daemon_; }
 
@@ -77,7 +78,7 @@ class DaemonWorld {
 
     const TemporaryDirectory root_;
     const std::string socket_ = root_.path() + "/run/kelvod/com.quillon.kelvod";
-    const XvfbServer screen_{kWidth, kHeight};
+    XvfbServer screen_{kWidth, kHeight};
     const WindowManager windowManager_{screen_.display()};
     SoundServer sound_;
     std::unique_ptr<ChildProcess> daemon_;

@@ -108,6 +108,27 @@ TEST_F(LibraryCommandTest, RecordingIsKeptWhileAnotherProgramHoldsTheLibrary) {
     EXPECT_TRUE(world.store().empty());
 }
 
+TEST_F(LibraryCommandTest, RecordingThatALostDisplayEndedIsRecoveredByTheDaemonThatRunsOn) {
+    KelvoctlProcess recording(world.socket(), {"record"}, KELVOCTL_PROGRAM, world.display());
+    ASSERT_TRUE(recording.waitForLine("recording")) << world.log();
+    std::this_thread::sleep_for(1s);
+    world.loseScreen();
+    EXPECT_EQ(recording.waitForExit(), 1);
+    EXPECT_NE(recording.output().find("the daemon has no display, or lost it."), std::string::npos)
+        << recording.output();
+    ASSERT_EQ(world.store().size(), 1U);
+    Answer answer;
+    EXPECT_TRUE(test::eventually([&] {
+        answer = run({"library", "recover"});
+        return answer.second != "there is nothing to recover\n";
+    }));
+    EXPECT_EQ(answer.first, 0);
+    EXPECT_TRUE(answer.second.starts_with("saved ScreenRecording_")) << answer.second << world.log();
+    ASSERT_EQ(world.library().size(), 1U);
+    EXPECT_EQ(test::decodingComplaints(world.library().front()), "");
+    EXPECT_TRUE(world.store().empty());
+}
+
 TEST_F(LibraryCommandTest, ProgramOutsideOfTheBundleIsRefused) {
     const std::string copy = world.root() + "/kelvoctl";
     std::filesystem::copy_file(KELVOCTL_PROGRAM, copy);

@@ -5,6 +5,7 @@
 
 #include <cerrno>
 #include <future>
+#include <set>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -47,7 +48,10 @@ class MovieRecoveryTest : public testing::Test {
     }
     bool isInStore(const std::string& name) { return device.fileSystem->itemExists(path(name)); }
 
-    void start() { service = LibraryService::create(device.platform()); }
+    void start() {
+        service = LibraryService::create(
+            device.platform(), [this](const std::string& name) { return inUse.copy().contains(name); });
+    }
     std::future<Answer> ask(Request request, bool isShell = true) {
         device.ipc->setIdentity(7,
                                 isShell ? Dictionary{{"com.quillon.private.kelvo-kit", true}} : Dictionary());
@@ -67,6 +71,7 @@ class MovieRecoveryTest : public testing::Test {
 
     const test::LogRecorder log;
     SimulatedDevice device;
+    Guarded<std::set<std::string>> inUse;
     std::shared_ptr<LibraryService> service;
     std::vector<IPCConnectionRef> connections;
 };
@@ -82,24 +87,24 @@ TEST_F(MovieRecoveryTest, EmptyStoreIsNotSpokenOfAndGivesNothing) {
 }
 
 TEST_F(MovieRecoveryTest, MoviesOfAnEarlierRunAreSaidAtTheStartAndLeftWhereTheyAre) {
-    leave("one.mp4");
-    leave("two.mp4");
+    leave("ScreenRecording_1.mp4");
+    leave("ScreenRecording_2.mp4");
     start();
     EXPECT_TRUE(
         log.contains("movies of an earlier run lie in the store: 2; kelvoctl library recover saves them"));
-    EXPECT_TRUE(isInStore("one.mp4"));
+    EXPECT_TRUE(isInStore("ScreenRecording_1.mp4"));
     EXPECT_THAT(device.photoLibrary->items(), IsEmpty());
 }
 
 TEST_F(MovieRecoveryTest, EachIsMixedAndSavedAndLeavesTheStore) {
-    leave("one.mp4");
-    leave("two.mp4");
+    leave("ScreenRecording_1.mp4");
+    leave("ScreenRecording_2.mp4");
     start();
     const Answer answer = recover();
     EXPECT_FALSE(answer.error);
     ASSERT_EQ(answer.movies.size(), 2U);
-    EXPECT_EQ(textIn(answer.movies[0], "name"), "one.mp4");
-    EXPECT_EQ(textIn(answer.movies[1], "name"), "two.mp4");
+    EXPECT_EQ(textIn(answer.movies[0], "name"), "ScreenRecording_1.mp4");
+    EXPECT_EQ(textIn(answer.movies[1], "name"), "ScreenRecording_2.mp4");
     const auto items = device.photoLibrary->items();
     ASSERT_EQ(items.size(), 2U);
     EXPECT_EQ(textIn(answer.movies[0], "identifier"), items[0].asset.localIdentifier);
@@ -109,7 +114,7 @@ TEST_F(MovieRecoveryTest, EachIsMixedAndSavedAndLeavesTheStore) {
 }
 
 TEST_F(MovieRecoveryTest, SecondRecoveryHasNothingLeft) {
-    leave("one.mp4");
+    leave("ScreenRecording_1.mp4");
     start();
     recover();
     EXPECT_THAT(recover().movies, IsEmpty());
@@ -117,73 +122,119 @@ TEST_F(MovieRecoveryTest, SecondRecoveryHasNothingLeft) {
 }
 
 TEST_F(MovieRecoveryTest, MovieThatCannotBeMixedIsSavedAsItIs) {
-    leave("one.mp4");
+    leave("ScreenRecording_1.mp4");
     device.failNext("ExportSession.export", ENOSPC);
     start();
     EXPECT_EQ(recover().movies.size(), 1U);
     ASSERT_EQ(device.photoLibrary->items().size(), 1U);
-    EXPECT_EQ(device.photoLibrary->items().front().moviePath, path("one.mp4"));
-    EXPECT_FALSE(isInStore("one.mp4"));
+    EXPECT_EQ(device.photoLibrary->items().front().moviePath, path("ScreenRecording_1.mp4"));
+    EXPECT_FALSE(isInStore("ScreenRecording_1.mp4"));
 }
 
 TEST_F(MovieRecoveryTest, MovieThatCannotBeSavedStaysAndTheNextIsTaken) {
-    leave("one.mp4");
-    leave("two.mp4");
+    leave("ScreenRecording_1.mp4");
+    leave("ScreenRecording_2.mp4");
     device.failNext("PhotoLibrary.createVideoAsset", ENOSPC);
     start();
     const Answer answer = recover();
     ASSERT_EQ(answer.movies.size(), 2U);
     ASSERT_NE(answer.movies[0].find("error"), nullptr);
     EXPECT_EQ(answer.movies[0].find("error")->asError()->code(), ENOSPC);
-    EXPECT_THAT(*device.fileSystem->namesInDirectory(path("")), ElementsAre("one.mp4"));
+    EXPECT_THAT(*device.fileSystem->namesInDirectory(path("")), ElementsAre("ScreenRecording_1.mp4"));
     EXPECT_EQ(recover().movies.size(), 1U);  // there is room again
-    EXPECT_FALSE(isInStore("one.mp4"));
+    EXPECT_FALSE(isInStore("ScreenRecording_1.mp4"));
 }
 
 TEST_F(MovieRecoveryTest, WhatCannotBePlayedGoesWithoutBeingSaved) {
-    device.fileSystem->addFile(path("empty.mp4"), 0, 1h);
+    device.fileSystem->addFile(path("ScreenRecording_0.mp4"), 0, 1h);
     start();
     EXPECT_THAT(recover().movies, IsEmpty());
-    EXPECT_FALSE(isInStore("empty.mp4"));
-    EXPECT_TRUE(log.contains("nothing to save in empty.mp4"));
+    EXPECT_FALSE(isInStore("ScreenRecording_0.mp4"));
+    EXPECT_TRUE(log.contains("nothing to save in ScreenRecording_0.mp4"));
 }
 
 TEST_F(MovieRecoveryTest, MovieThatTheLibraryHasAlreadyIsNotSavedAgain) {
-    leave("one.mp4");
-    ASSERT_TRUE(device.photoLibrary->createVideoAsset(URL::file(path("one.mp4"))));
+    leave("ScreenRecording_1.mp4");
+    ASSERT_TRUE(device.photoLibrary->createVideoAsset(URL::file(path("ScreenRecording_1.mp4"))));
     start();
     EXPECT_THAT(recover().movies, IsEmpty());
     EXPECT_EQ(device.photoLibrary->items().size(), 1U);
-    EXPECT_FALSE(isInStore("one.mp4"));
+    EXPECT_FALSE(isInStore("ScreenRecording_1.mp4"));
 }
 
-TEST_F(MovieRecoveryTest, UnfinishedMixesAndTrimsGoForTheMovieTheyWereMadeFrom) {
-    leave("Game.mp4");
-    leave("Game_trimmed.mp4");
+TEST_F(MovieRecoveryTest, UnfinishedMixGoesForTheMovieItWasMadeFrom) {
+    leave("ScreenRecording_1.mp4");
     leave("KVKelvo_Final1700000000.mp4");
-    leave("Only_trimmed.mp4");
     start();
-    const Answer answer = recover();
-    ASSERT_EQ(answer.movies.size(), 2U);
-    EXPECT_EQ(textIn(answer.movies[0], "name"), "Game.mp4");
-    EXPECT_EQ(textIn(answer.movies[1], "name"), "Only_trimmed.mp4");
-    EXPECT_THAT(*device.fileSystem->namesInDirectory(path("")), IsEmpty());
+    leave("KVKelvo_Final1700000001.mp4");  // is being made
+    EXPECT_EQ(recover().movies.size(), 1U);
+    EXPECT_THAT(*device.fileSystem->namesInDirectory(path("")), ElementsAre("KVKelvo_Final1700000001.mp4"));
 }
 
-TEST_F(MovieRecoveryTest, RecordingOfThisRunIsLeftAlone) {
-    leave("Game.mp4", 1h);
+TEST_F(MovieRecoveryTest, MoviesOfApplicationsAreLeftToThem) {
+    for (const char* name : {"Game.mp4", "Game_trimmed.mp4", "KVMovie_game_1.000000_0.mp4"})
+        leave(name);
     device.fileSystem->addFile(path("notes.txt"), 1, 1h);
+    device.fileSystem->addFile(path("ScreenRecording_1.txt"), 1, 1h);
     start();
-    leave("Game.mp4", 0s);  // the application records itself again
-    leave("new.mp4", 0s);
+    EXPECT_THAT(log.texts(), testing::Not(testing::Contains(HasSubstr("an earlier run"))));
     EXPECT_THAT(recover().movies, IsEmpty());
-    EXPECT_TRUE(isInStore("Game.mp4"));
-    EXPECT_TRUE(isInStore("new.mp4"));
-    EXPECT_TRUE(isInStore("notes.txt"));
+    EXPECT_EQ(device.fileSystem->namesInDirectory(path(""))->size(), 5U);
+    EXPECT_THAT(device.photoLibrary->items(), IsEmpty());
+}
+
+TEST_F(MovieRecoveryTest, RecordingOfThisRunThatNobodySavedIsRecovered) {
+    start();
+    leave("ScreenRecording_1.mp4", 3s);
+    const Answer answer = recover();
+    ASSERT_EQ(answer.movies.size(), 1U);
+    EXPECT_EQ(textIn(answer.movies[0], "name"), "ScreenRecording_1.mp4");
+    EXPECT_EQ(device.photoLibrary->items().size(), 1U);
+    EXPECT_FALSE(isInStore("ScreenRecording_1.mp4"));
+}
+
+TEST_F(MovieRecoveryTest, WhatSomebodyUsesIsLeftAlone) {
+    leave("ScreenRecording_1.mp4");
+    inUse.set({"ScreenRecording_1.mp4", "ScreenRecording_2.mp4"});
+    start();
+    leave("ScreenRecording_2.mp4");
+    EXPECT_THAT(recover().movies, IsEmpty());
+    EXPECT_TRUE(isInStore("ScreenRecording_1.mp4"));
+    inUse.set({});
+    EXPECT_EQ(recover().movies.size(), 2U);
+}
+
+TEST_F(MovieRecoveryTest, WhatIsTakenUpMeanwhileIsLeftAlone) {
+    leave("ScreenRecording_1.mp4");
+    leave("ScreenRecording_2.mp4");
+    device.media->holdExports(true);
+    start();
+    auto recovered = ask(&KVLibraryProtocol::recoverMovies);
+    ASSERT_TRUE(test::eventually([&] { return !device.media->exportSessions().empty(); }));
+    inUse.set({"ScreenRecording_2.mp4"});
+    device.media->exportSessions().front()->resume();
+    EXPECT_EQ(recovered.get().movies.size(), 1U);
+    EXPECT_TRUE(isInStore("ScreenRecording_2.mp4"));
+}
+
+TEST_F(MovieRecoveryTest, WhatWasWrittenLatelyIsLeftAlone) {
+    leave("ScreenRecording_1.mp4", 1h);
+    start();
+    leave("ScreenRecording_1.mp4", 2s);  // recorded anew
+    leave("ScreenRecording_2.mp4", 0s);
+    EXPECT_THAT(recover().movies, IsEmpty());
+    EXPECT_TRUE(isInStore("ScreenRecording_1.mp4"));
+    EXPECT_TRUE(isInStore("ScreenRecording_2.mp4"));
+}
+
+TEST_F(MovieRecoveryTest, WhatWasWrittenRightBeforeACrashIsRecoveredAtOnce) {
+    leave("ScreenRecording_1.mp4", 0s);
+    start();
+    EXPECT_EQ(recover().movies.size(), 1U);
 }
 
 TEST_F(MovieRecoveryTest, OneRecoveryAtATime) {
-    leave("one.mp4");
+    leave("ScreenRecording_1.mp4");
     device.media->holdExports(true);
     start();
     auto first = ask(&KVLibraryProtocol::recoverMovies);
@@ -198,8 +249,8 @@ TEST_F(MovieRecoveryTest, OneRecoveryAtATime) {
 TEST_F(MovieRecoveryTest, LibraryIsListed) {
     start();
     EXPECT_THAT(list().movies, IsEmpty());
-    leave("one.mp4", 1h, 123);
-    ASSERT_TRUE(device.photoLibrary->createVideoAsset(URL::file(path("one.mp4"))));
+    leave("ScreenRecording_1.mp4", 1h, 123);
+    ASSERT_TRUE(device.photoLibrary->createVideoAsset(URL::file(path("ScreenRecording_1.mp4"))));
     const Answer answer = list();
     EXPECT_FALSE(answer.error);
     ASSERT_EQ(answer.movies.size(), 1U);
@@ -219,7 +270,7 @@ TEST_F(MovieRecoveryTest, LibraryThatCannotBeReadIsAnError) {
 }
 
 TEST_F(MovieRecoveryTest, OnlyTheShellIsAnswered) {
-    leave("one.mp4");
+    leave("ScreenRecording_1.mp4");
     start();
     for (const Request request : {&KVLibraryProtocol::listMovies, &KVLibraryProtocol::recoverMovies}) {
         const Answer answer = ask(request, false).get();
@@ -227,7 +278,7 @@ TEST_F(MovieRecoveryTest, OnlyTheShellIsAnswered) {
         EXPECT_EQ(answer.error->code(), EPERM);
         EXPECT_THAT(answer.movies, IsEmpty());
     }
-    EXPECT_TRUE(isInStore("one.mp4"));
+    EXPECT_TRUE(isInStore("ScreenRecording_1.mp4"));
 }
 
 }  // namespace
