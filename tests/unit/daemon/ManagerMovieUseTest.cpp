@@ -1,4 +1,5 @@
 #include "ManagerFixture.h"
+#include "support/Eventually.h"
 
 namespace kelvo {
 namespace {
@@ -102,6 +103,17 @@ TEST_F(ManagerMovieUseTest, MovieIsInUseWhileItIsSavedWhoeverHasGone) {
     while (!isSaved || isInUse())
         device.settle();
     EXPECT_FALSE(device.fileSystem->itemExists(kMovie.path()));
+}
+
+TEST_F(ManagerMovieUseTest, SaveEndsTheUseAlsoOfAClientThatStays) {
+    begin();
+    stop();
+    std::atomic<bool> isSaved = false;
+    manager->saveVideoToCameraRoll(kMovie, [&](const OptionalError&) { isSaved = true; });
+    EXPECT_TRUE(test::eventually([&] {
+        device.settle();
+        return isSaved && !isInUse();
+    }));
 }
 
 TEST_F(ManagerMovieUseTest, MovieIsInUseWhileItIsSavedForTheNextRecording) {

@@ -62,6 +62,8 @@ void MixTimeline::write(StreamIndex stream, std::chrono::nanoseconds moment,
                                                                                    : -1;
         const std::int64_t position = follows ? writer.end : begin;
         const auto frames = static_cast<std::int64_t>(samples.size() / channels_);
+        // Whatever put the stream that far ahead was wrong: it would be silent until the time has come.
+        if (distance < -framesIn(kLongestOverlap, rate_)) writer.hasSounded = false;
         // A stream that falls back does not sound twice at once.
         const std::int64_t overlap = std::clamp<std::int64_t>(writer.end - position, 0, frames);
         const std::int64_t skipped = writer.hasSounded ? overlap : 0;

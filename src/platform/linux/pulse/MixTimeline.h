@@ -22,6 +22,7 @@ class MixTimeline {
     static constexpr std::chrono::milliseconds kSettling{40};
     static constexpr std::size_t kMostStreams = 16;
     static constexpr std::chrono::milliseconds kSlack{10};
+    static constexpr std::chrono::milliseconds kLongestOverlap{100};
     static constexpr std::chrono::seconds kReach{4};
 
     /// From the moment `start` on; `channels` 16-bit samples a frame.
@@ -37,7 +38,8 @@ class MixTimeline {
     /// Adds `samples` (whole frames) of `stream` that began to sound at `moment`. A block that comes within
     /// `kSlack` of the end of the one before follows it without a seam, and is made a frame longer or shorter
     /// where that brings the stream back to its moments. What lies before the end of the stream so far,
-    /// before the reading position, or more than `kReach` ahead of it, is lost.
+    /// before the reading position, or more than `kReach` ahead of it, is lost; but a stream that falls back
+    /// by more than `kLongestOverlap` begins anew there.
     void write(StreamIndex stream, std::chrono::nanoseconds moment, std::span<const std::int16_t> samples);
 
     /// How many frames can be read at the moment `now`.

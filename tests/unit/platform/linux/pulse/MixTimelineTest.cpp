@@ -137,6 +137,25 @@ TEST_F(MixTimelineTest, StreamThatFallsBackDoesNotSoundTwice) {
     EXPECT_THAT(read(5), Each(0));
 }
 
+TEST_F(MixTimelineTest, StreamThatWasPutTooFarAheadOnceIsHeardAgainAtOnce) {
+    const auto stream = timeline.addStream(10s);
+    timeline.write(stream, 10s, Samples(20, 1));
+    timeline.write(stream, 12s, Samples(20, 1));
+    timeline.write(stream, 10s + 20ms, Samples(20, 1));
+    timeline.write(stream, 10s + 40ms, Samples(20, 1));
+    EXPECT_EQ(timeline.readableFrames(10s + 150ms), 60) << "it is waited for again";
+    EXPECT_THAT(read(60), Each(1));
+}
+
+TEST_F(MixTimelineTest, StreamThatWasPutBeyondTheReachGoesOnWhereItWas) {
+    const auto stream = timeline.addStream(10s);
+    timeline.write(stream, 10s, Samples(20, 1));
+    timeline.write(stream, 10s + 24h, Samples(20, 9));
+    timeline.write(stream, 10s + 20ms, Samples(20, 1));
+    EXPECT_THAT(read(40), Each(1));
+    EXPECT_THAT(read(4000), Each(0));
+}
+
 TEST_F(MixTimelineTest, SoundBeyondTheReachIsLost) {
     const auto stream = timeline.addStream(10s);
     timeline.write(stream, 10s + MixTimeline::kReach, Samples{5});
