@@ -1,8 +1,8 @@
+#include "MovieFiles.h"
 #include "platform/linux/library/MovieLibrary.h"
 #include "platform/linux/system/KernelRandom.h"
 #include "support/Eventually.h"
 #include "support/LogRecorder.h"
-#include "support/TemporaryDirectory.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -11,7 +11,6 @@
 #include <filesystem>
 #include <fstream>
 #include <future>
-#include <iterator>
 #include <sqlite3.h>
 #include <sys/file.h>
 #include <sys/mount.h>
@@ -23,16 +22,10 @@ namespace kelvo {
 namespace {
 
 namespace fs = std::filesystem;
+using test::contentOf;
 using namespace std::chrono_literals;
 using testing::Contains;
 using testing::HasSubstr;
-
-constexpr std::int64_t kRecordedAt = 1700000000;
-
-std::string contentOf(const std::string& path) {
-    std::ifstream file(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
-}
 
 enum class Holder { ofTheFolder, ofTheIndex };
 
@@ -43,10 +36,7 @@ class HeldLibraryTest : public testing::TestWithParam<Holder> {
     ~HeldLibraryTest() override { letGo(); }
 
     std::string movie(const std::string& name, const std::string& content) const {
-        std::string path = store.write(name, content);
-        fs::last_write_time(path, fs::file_time_type::clock::from_sys(
-                                      std::chrono::sys_seconds(std::chrono::seconds(kRecordedAt))));
-        return path;
+        return test::writeMovie(store, name, content);
     }
 
     void hold() {
@@ -115,7 +105,7 @@ TEST_P(HeldLibraryTest, NewMovieComesInWithItsIdentifierAndDateOnceItIsLetGo) {
     ASSERT_EQ(movies->size(), 2U);
     const LibraryMovie& taken = (*movies)[(*movies)[0].identifier == first ? 1 : 0];
     EXPECT_EQ(taken.identifier, *second);
-    EXPECT_EQ(taken.creationDate.secondsSince1970(), kRecordedAt);
+    EXPECT_EQ(taken.creationDate.secondsSince1970(), test::kRecordedAt);
     EXPECT_THAT(taken.path, testing::EndsWith(" 2.mp4"));
     EXPECT_EQ(contentOf(taken.path), "second");
     EXPECT_EQ(countFiles(), 2U);
@@ -136,7 +126,7 @@ TEST_P(HeldLibraryTest, CopyThatWaitsKeepsTheDateOfTheMovie) {
     const auto movies = library.movies();
     ASSERT_EQ(movies->size(), 2U);
     for (const LibraryMovie& each : *movies)
-        EXPECT_EQ(each.creationDate.secondsSince1970(), kRecordedAt);
+        EXPECT_EQ(each.creationDate.secondsSince1970(), test::kRecordedAt);
 }
 
 TEST_P(HeldLibraryTest, MovieThatWaitedIsTakenInOnce) {

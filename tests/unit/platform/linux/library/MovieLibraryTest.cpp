@@ -1,13 +1,12 @@
+#include "MovieFiles.h"
 #include "platform/linux/library/MovieLibrary.h"
 #include "platform/linux/system/KernelRandom.h"
-#include "support/TemporaryDirectory.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
-#include <iterator>
 #include <set>
 #include <sqlite3.h>
 #include <sys/mount.h>
@@ -21,20 +20,12 @@ namespace kelvo {
 namespace {
 
 namespace fs = std::filesystem;
-
-std::string contentOf(const std::string& path) {
-    std::ifstream file(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
-}
+using test::contentOf;
 
 class MovieLibraryTest : public testing::Test {
   protected:
     std::string movie(const std::string& name, const std::string& content) const {
-        std::string path = store.write(name, content);
-        // One second of one day, so that names clash.
-        fs::last_write_time(path, fs::file_time_type::clock::from_sys(
-                                      std::chrono::sys_seconds(std::chrono::seconds(1700000000))));
-        return path;
+        return test::writeMovie(store, name, content);
     }
     /// The names in the library's folder, without the index.
     std::vector<std::string> files() const {
