@@ -65,7 +65,7 @@ Result<std::string> MovieLibrary::add(const std::string& moviePath) {
 
 OptionalError MovieLibrary::addOrLeave(const UniqueFd& source, const LibraryEntry& entry) {
     auto access = Access::begin(folder_, patience_);
-    const OptionalError error = access ? access->add(source, entry) : access.error();
+    OptionalError error = access ? access->add(source, entry) : access.error();
     if (!error || error->code() != EBUSY) return error;
     KVLogError("%s; the new recording comes in when that ends", error->localizedDescription().c_str());
     return Access::leave(folder_, source, entry);
