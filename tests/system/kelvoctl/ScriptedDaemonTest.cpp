@@ -150,6 +150,15 @@ TEST_F(KelvoctlRecordingTest, RecordingThatSomebodyElseStopsEnds) {
     EXPECT_NE(record.output().find("stopped from elsewhere"), std::string::npos);
 }
 
+TEST_F(KelvoctlRecordingTest, OutputThatSomebodyElsesStopLeavesUnwrittenIsAFailure) {
+    KelvoctlProcess record(socket, {"record", "--output", root.path() + "/out.mp4"});
+    ASSERT_TRUE(record.waitForLine("recording;"));
+    daemon->isRecording = false;
+    client().updateScreenRecordingState();
+    EXPECT_EQ(record.waitForExit(), 1);
+    EXPECT_FALSE(std::filesystem::exists(root.path() + "/out.mp4"));
+}
+
 TEST_F(KelvoctlRecordingTest, SecondCtrlCLeavesWithoutWaiting) {
     daemon->staysSilent = true;
     KelvoctlProcess record(socket, {"record"});
