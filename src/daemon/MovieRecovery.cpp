@@ -14,6 +14,7 @@ namespace {
 using namespace std::chrono_literals;
 
 constexpr std::string_view kMovieSuffix = ".mp4";
+constexpr std::string_view kTrimmedSuffix = "_trimmed.mp4";
 /// What a recording that ended by itself still had in its encoder is in the file by then.
 constexpr std::chrono::nanoseconds kLastWrite = 2s;
 
@@ -22,12 +23,16 @@ std::string pathInStore(const std::string& name) {
 }
 
 bool isOfTheWholeScreen(const std::string& name) {
-    return name.starts_with(KVTemporaryFileStore::kScreenRecordingPrefix) && name.ends_with(kMovieSuffix);
+    return name.starts_with(KVTemporaryFileStore::kScreenRecordingPrefix);
 }
 
-/// What mixing was making when the daemon ended: the movie that it was made from is there, too.
-bool isMix(const std::string& name) {
-    return name.starts_with(KVTemporaryFileStore::kMixedMoviePrefix);
+/// Whether `name` is what became, or was becoming, of another of those movies.
+bool isMadeFromAnother(const std::string& name, const std::map<std::string, FileAttributes>& all) {
+    // What mixing was making when the daemon ended: the movie that it was made from is there, too.
+    if (name.starts_with(KVTemporaryFileStore::kMixedMoviePrefix)) return true;
+    if (!name.ends_with(kTrimmedSuffix)) return false;
+    const std::string stem = name.substr(0, name.size() - kTrimmedSuffix.size());
+    return all.contains(stem + std::string(kMovieSuffix));
 }
 
 }  // namespace
@@ -42,17 +47,14 @@ MovieRecovery::MovieRecovery(const Platform& platform, const std::shared_ptr<KVU
                              InUse isInUse)
     : isInUse_(std::move(isInUse)), platform_(platform), mixer_(platform.media, platform.clock, errors) {
     std::map<std::string, FileAttributes> found;
-    std::size_t recordings = 0;
     const auto names = platform_.fileSystem->namesInDirectory(KVTemporaryFileStore::_srTempPath());
     for (const std::string& name : names.valueOr({})) {
         const auto file = platform_.fileSystem->attributesOfItem(pathInStore(name));
-        if (!file || file->isDirectory) continue;
-        found.emplace(name, *file);
-        recordings += isOfTheWholeScreen(name) ? 1 : 0;
+        if (file && !file->isDirectory && name.ends_with(kMovieSuffix)) found.emplace(name, *file);
     }
-    if (recordings > 0) {
+    if (!found.empty()) {
         KVLog("movies of an earlier run lie in the store: %zu; kelvoctl library recover saves them",
-              recordings);
+              found.size());
     }
     leftovers_.set(std::move(found));
 }
@@ -62,22 +64,27 @@ OptionalError MovieRecovery::recover(Handler handler) {
     const auto work = std::make_shared<Work>();
     work->handler = std::move(handler);
     const auto names = platform_.fileSystem->namesInDirectory(KVTemporaryFileStore::_srTempPath());
+    const auto leftovers = leftovers_.copy();
     for (const std::string& name : names.valueOr({})) {
-        const auto file = platform_.fileSystem->attributesOfItem(pathInStore(name));
-        if (isMix(name) && file && isAsItWas(name, *file)) remove(pathInStore(name));
-        if (isForsaken(name)) work->names.push_back(name);
+        if (!isForsaken(name)) continue;
+        if (isMadeFromAnother(name, leftovers)) {
+            remove(pathInStore(name));
+        } else {
+            work->names.push_back(name);
+        }
     }
     std::ranges::sort(work->names);
     recoverNext(work);
     return std::nullopt;
 }
 
-/// Whether it is a recording of the whole screen that nobody of this run will save.
+/// Whether nobody of this run will save it. An application that runs may yet do so with its own.
 bool MovieRecovery::isForsaken(const std::string& name) const {
     const auto file = platform_.fileSystem->attributesOfItem(pathInStore(name));
-    if (!file || file->isDirectory || !isOfTheWholeScreen(name)) return false;
+    if (!file || file->isDirectory || !name.ends_with(kMovieSuffix)) return false;
     if (isInUse_ && isInUse_(name)) return false;
-    return isAsItWas(name, *file) || platform_.clock->now() - file->modificationDate > kLastWrite;
+    const auto age = platform_.clock->now() - file->modificationDate;
+    return isAsItWas(name, *file) || (isOfTheWholeScreen(name) && age > kLastWrite);
 }
 
 /// A recording of this run may have taken the name over.

@@ -13,10 +13,10 @@
 
 namespace kelvo {
 
-/// Brings recordings of the whole screen that lie in the store with nobody to save them to the library: those
-/// that an earlier run of the daemon left because it crashed or had no time, and those of this run that could
-/// not be saved or whose recording ended by itself. An application's own movies are the application's, and
-/// are left alone. Thread-safe.
+/// Brings movies that lie in the store with nobody to save them to the library: all that an earlier run of
+/// the daemon left because it crashed or had no time, and of this run the recordings of the whole screen that
+/// could not be saved or that ended by themselves. What an application recorded of itself in this run is left
+/// to it. Thread-safe.
 class MovieRecovery : public std::enable_shared_from_this<MovieRecovery> {
   public:
     using Handler = std::function<void(const std::vector<Dictionary>& movies)>;
@@ -25,7 +25,7 @@ class MovieRecovery : public std::enable_shared_from_this<MovieRecovery> {
     using InUse = std::function<bool(const std::string& name)>;
 
     /// Notes what lies in the store now: whatever comes later is this run's own. Says so in the log when it
-    /// is any recording of the whole screen. `isInUse` may be none.
+    /// is anything. `isInUse` may be none.
     MovieRecovery(const Platform& platform, const std::shared_ptr<KVUserErrors>& errors, InUse isInUse);
 
     /// Mixes and saves those movies one by one, in the background, and takes each out of the store: the saved

@@ -22,8 +22,8 @@ class KVLibraryProtocol {
     /// The library's movies, oldest first: "identifier", "path" (on this machine), "creationDate", "size".
     virtual void listMovies(MoviesHandler handler) = 0;
 
-    /// Saves the recordings of the whole screen that lie in the daemon's store with nobody to save them to
-    /// the library, and cleans them from the store; one call at a time (EBUSY). Each movie is told by its
+    /// Saves the movies that lie in the daemon's store with nobody to save them to the library, and cleans
+    /// them from the store; one call at a time (EBUSY). Each movie is told by its
     /// "name" in the store, and with "identifier" and "path" where it is saved now, or with "error" why it is
     /// not. One that could not be saved stays in the store; one in which there is nothing to play goes.
     virtual void recoverMovies(MoviesHandler handler) = 0;
