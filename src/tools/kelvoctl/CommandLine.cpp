@@ -79,7 +79,8 @@ constexpr std::array<CommandText, 9> kCommands{{
      "each is an object with \"identifier\", \"path\", \"creationDate\" (seconds since 1970) and \"size\".\n"
      "\n"
      "  recover          save the movies that a crash or a log-out left, and recordings of the whole screen\n"
-     "                   that a lost display ended, and take them out of the daemon's store. The exit status\n"
+     "                   that a lost display ended, and take them out of the daemon's store. The exit "
+     "status\n"
      "                   is 1 when one cannot be saved; it stays in the store then\n"},
     {Command::watch, "watch", "", "print what the daemon tells the shell, as it comes",
      "Usage: kelvoctl watch [--json]\n"
