@@ -53,8 +53,6 @@ void configureSoftware(AVCodecContext& context, const VideoSettings& settings,
     setPrivateOption(context, "profile", profileName(settings.profile));
     if (purpose == VideoEncoder::Purpose::live) {
         setPrivateOption(context, "tune", "zerolatency");
-        // Handing halves of a frame's first, coarse analysis to threads costs more than the analysis.
-        setPrivateOption(context, "x264-params", "lookahead-threads=1");
         context.thread_count =
             static_cast<int>(std::clamp(std::thread::hardware_concurrency(), 1U, kMostLiveThreads));
     } else {
