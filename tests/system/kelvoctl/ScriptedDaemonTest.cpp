@@ -124,7 +124,9 @@ TEST_F(KelvoctlRecordingTest, RecordingThatTheSystemEndsIsToldWithItsReason) {
 
 TEST_F(KelvoctlRecordingTest, RecordingThatEndsBeforeItsStartIsAnsweredIsTold) {
     const KVError error("domain", -5817, {{std::string(kLocalizedDescriptionKey), "no screen"}});
-    daemon->beforeStartIsAnswered.set([&] { client().recordingDidStopWithError(error, std::nullopt); });
+    // A copy: the thread that calls this lives longer than the test's own variables.
+    daemon->beforeStartIsAnswered.set(
+        [this, error] { client().recordingDidStopWithError(error, std::nullopt); });
     KelvoctlProcess record(socket, {"record"});
     EXPECT_EQ(record.waitForExit(), 1);
     EXPECT_NE(record.output().find("kelvoctl: no screen (domain -5817)\n"), std::string::npos)
