@@ -4,8 +4,8 @@
     bench/recording.py [BUILD_FOLDER] [--seconds 40] [--recordings 200] [--long 60]
 
 Starts an X server of 1080x1920, a PulseAudio server with a microphone and an application that plays, and a program that
-scrolls text. The peer is `ffmpeg -f x11grab` on the same screen and the same sound, one after the other, with the encoder,
-preset, bit rate and size that the daemon uses (x264 superfast, zerolatency, 5 Mb/s). Needs Xvfb, pulseaudio, ffmpeg.
+scrolls text. The peer is `ffmpeg -f x11grab` on the same screen and the same sound, in turn, with the encoder, preset,
+bit rate and size that the daemon uses (x264 superfast, zerolatency, 5 Mb/s). Needs Xvfb, pulseaudio, ffmpeg.
 """
 import argparse
 import contextlib

@@ -4,7 +4,6 @@
 #include "platform/linux/media/EncoderSettings.h"
 #include "platform/linux/media/LavPointers.h"
 
-#include <array>
 #include <cstdint>
 #include <functional>
 #include <span>

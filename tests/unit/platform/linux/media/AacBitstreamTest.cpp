@@ -1,6 +1,8 @@
 #include "SoundFixture.h"
 #include "platform/linux/media/AacBitstream.h"
 
+#include <algorithm>
+
 namespace kelvo::test {
 namespace {
 

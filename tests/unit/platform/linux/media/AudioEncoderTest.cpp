@@ -1,6 +1,8 @@
 #include "SoundFixture.h"
 #include "platform/linux/media/AudioEncoder.h"
 
+#include <algorithm>
+
 namespace kelvo::test {
 namespace {
 

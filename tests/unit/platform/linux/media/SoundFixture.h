@@ -2,7 +2,6 @@
 
 #include "platform/linux/media/AudioEncoder.h"
 
-#include <array>
 #include <cmath>
 #include <cstring>
 #include <numbers>
