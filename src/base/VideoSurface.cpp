@@ -37,7 +37,17 @@ bool VideoSurface::Geometry::isValid() const {
 }
 
 VideoSurface::VideoSurface(UniqueFd descriptor, const Geometry& geometry, std::byte* pixels, bool isWritable)
-    : descriptor_(std::move(descriptor)), geometry_(geometry), pixels_(pixels), isWritable_(isWritable) {}
+    : descriptor_(std::move(descriptor)),
+      geometry_(geometry),
+      file_(fileOf(descriptor_.get()).value_or(File())),
+      pixels_(pixels),
+      isWritable_(isWritable) {}
+
+std::optional<VideoSurface::File> VideoSurface::fileOf(int descriptor) {
+    struct stat status {};
+    if (::fstat(descriptor, &status) != 0) return std::nullopt;
+    return File{status.st_dev, status.st_ino};
+}
 
 VideoSurface::~VideoSurface() {
     ::munmap(pixels_, geometry_.byteCount());

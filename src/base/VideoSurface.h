@@ -9,6 +9,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <span>
 
 namespace kelvo {
@@ -38,6 +39,17 @@ class VideoSurface : public ObjectHandle {
         friend bool operator==(const Geometry&, const Geometry&) = default;
     };
 
+    /// Names its memory file among all files of the machine, for as long as somebody has it open.
+    struct File {
+        std::uint64_t device = 0;
+        std::uint64_t number = 0;
+
+        friend bool operator==(const File&, const File&) = default;
+    };
+
+    /// The file behind a descriptor; none when there is none.
+    static std::optional<File> fileOf(int descriptor);
+
     /// A new surface of black pixels in a memory file of its own. Fails on a bad geometry and when memory or
     /// descriptors run out.
     static Result<std::shared_ptr<VideoSurface>> create(const Geometry& geometry);
@@ -50,6 +62,7 @@ class VideoSurface : public ObjectHandle {
     ~VideoSurface() override;
 
     const Geometry& geometry() const { return geometry_; }
+    const File& file() const { return file_; }
     std::uint32_t width() const { return geometry_.width; }
     std::uint32_t height() const { return geometry_.height; }
 
@@ -75,6 +88,7 @@ class VideoSurface : public ObjectHandle {
 
     UniqueFd descriptor_;
     Geometry geometry_;
+    File file_;
     std::byte* pixels_;
     bool isWritable_;
     std::atomic<bool> keepsOutNewWriters_{false};

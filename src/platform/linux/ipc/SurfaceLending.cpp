@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <sys/stat.h>
 #include <utility>
 
 namespace kelvo {
@@ -14,7 +13,8 @@ struct Loan {
     std::shared_ptr<void> lease;
 };
 
-/// The surface of an argument that may carry one; none for any other.
+}  // namespace
+
 std::shared_ptr<ObjectHandle> surfaceIn(const IPCArgument& description, const Value& argument) {
     if (description.allowedObjects != IPCObjects::surfaces) return nullptr;
     const Array* array = argument.asArray();
@@ -22,8 +22,6 @@ std::shared_ptr<ObjectHandle> surfaceIn(const IPCArgument& description, const Va
     const auto* handle = array->front().as<std::shared_ptr<ObjectHandle>>();
     return handle != nullptr ? *handle : nullptr;
 }
-
-}  // namespace
 
 LentSurfaces surfacesIn(const std::vector<IPCArgument>& description, const Array& arguments) {
     LentSurfaces surfaces;
@@ -50,11 +48,10 @@ std::vector<std::uint32_t> SurfaceReturns::take() {
 
 Result<VideoSurfaceRef> SurfaceCache::open(UniqueFd descriptor, const VideoSurface::Geometry& geometry,
                                            Moment now) {
-    struct stat status {};
-    if (::fstat(descriptor.get(), &status) != 0) return KVError::posix(errno, "surface descriptor");
+    const auto file = VideoSurface::fileOf(descriptor.get());
+    if (!file) return KVError::posix(errno, "surface descriptor");
     const auto known = std::ranges::find_if(entries_, [&](const Entry& entry) {
-        return entry.device == status.st_dev && entry.file == status.st_ino &&
-               entry.surface->geometry() == geometry;
+        return entry.surface->file() == *file && entry.surface->geometry() == geometry;
     });
     if (known != entries_.end()) {
         known->lastUse = now;
@@ -64,8 +61,20 @@ Result<VideoSurfaceRef> SurfaceCache::open(UniqueFd descriptor, const VideoSurfa
     if (!surface) return surface;
     if (entries_.size() == kMostSurfaces)
         entries_.erase(std::ranges::min_element(entries_, {}, &Entry::lastUse));
-    entries_.push_back({status.st_dev, status.st_ino, *surface, now});
+    entries_.push_back({*surface, now});
     return surface;
+}
+
+/// Of a file that was opened as several surfaces it is the one that was used last.
+VideoSurfaceRef SurfaceCache::find(const VideoSurface::File& file, Moment now) {
+    Entry* latest = nullptr;
+    for (Entry& each : entries_) {
+        if (each.surface->file() == file && (latest == nullptr || each.lastUse > latest->lastUse))
+            latest = &each;
+    }
+    if (latest == nullptr) return nullptr;
+    latest->lastUse = now;
+    return latest->surface;
 }
 
 void SurfaceCache::dropUnused(Moment now) {

@@ -10,7 +10,6 @@
 #include <cstdint>
 #include <memory>
 #include <optional>
-#include <sys/types.h>
 #include <vector>
 
 /// Surfaces are lent: the sender of a message keeps a surface out of its pool until the receiver has let go
@@ -18,6 +17,9 @@
 namespace kelvo {
 
 using LentSurfaces = std::vector<std::shared_ptr<ObjectHandle>>;
+
+/// The surface of an argument that may carry one; none for any other.
+std::shared_ptr<ObjectHandle> surfaceIn(const IPCArgument& description, const Value& argument);
 
 /// The surfaces among a message's arguments.
 LentSurfaces surfacesIn(const std::vector<IPCArgument>& description, const Array& arguments);
@@ -38,6 +40,11 @@ class SurfaceReturns {
     static constexpr std::size_t kMostTogether = 6;
     /// How long one waits for the others.
     static constexpr std::chrono::milliseconds kPatience{250};
+
+    /// Whether the surface that is let go of is the only one, and nothing waits.
+    bool isQuiet() const { return held_ == 1 && waiting_.empty(); }
+    /// That one is let go of, and the peer finds out by itself.
+    void letGoQuietly() { --held_; }
 
     /// A message with surfaces came. True when the peer is to be told now.
     bool hold() { return held_++ > 0 && !waiting_.empty(); }
@@ -68,14 +75,14 @@ class SurfaceCache {
     /// As `VideoSurface::fromDescriptor`.
     Result<VideoSurfaceRef> open(UniqueFd descriptor, const VideoSurface::Geometry& geometry, Moment now);
 
+    /// The surface of a file that was opened; none when it is not kept any more.
+    VideoSurfaceRef find(const VideoSurface::File& file, Moment now);
+
     void dropUnused(Moment now);
     bool empty() const { return entries_.empty(); }
 
   private:
-    /// The memory file's identity; its number is nobody else's for as long as the surface holds the file.
     struct Entry {
-        dev_t device;
-        ino_t file;
         VideoSurfaceRef surface;
         Moment lastUse;
     };
