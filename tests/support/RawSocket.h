@@ -25,6 +25,14 @@ namespace kelvo::test {
 struct WireMessage {
     Bytes bytes;
     std::vector<UniqueFd> descriptors;
+
+    /// Its texts are the bytes' own.
+    dbus::Message parsed() const {
+        std::uint32_t descriptorCount = 0;
+        auto message = dbus::parse(bytes, descriptorCount);
+        EXPECT_TRUE(message);
+        return message ? std::move(*message) : dbus::Message();
+    }
 };
 
 /// A peer without manners: the bare end of a stream socket, which reads and writes whatever it likes.

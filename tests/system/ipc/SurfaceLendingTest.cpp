@@ -32,8 +32,10 @@ struct Keeper : IPCListenerDelegate {
 /// A client that holds the frames it is sent for as long as the test wants.
 struct FrameHolder : test::FakeClientProxy {
     void captureHandlerWithSample(const std::shared_ptr<KVIOSurfaceObject>& surface,
-                                  const RecordBytes<TimingRecord>&) override {
+                                  const RecordBytes<TimingRecord>& timingData) override {
         held.with([&](auto& all) { all.push_back(surface->ioSurface()); });
+        FakeClientProxy::captureHandlerWithSample(surface, timingData);
+        videoSamples.set({});
     }
     std::size_t count() const {
         return held.with([](const auto& all) { return all.size(); });
@@ -147,6 +149,43 @@ TEST_F(SurfaceLendingTest, OneMemoryFileIsMappedOnce) {
     EXPECT_EQ(client->held.copy().front()->pixels().data(), first);
 }
 
+/// Frames take the shorter way as soon as they can; nobody notices.
+TEST_F(SurfaceLendingTest, FramesAndOtherNewsArriveInTheirOrder) {
+    VideoSurfacePool frames(VideoSurface::Geometry::packed(8, 8), 8);
+    std::vector<std::string> sent;
+    for (int i = 0; i < 300; ++i) {
+        VideoSurfaceRef surface;
+        ASSERT_TRUE(eventually([&] {
+            client->held.set({});
+            return (surface = *frames.take()) != nullptr;
+        }));
+        send(std::move(surface));
+        sent.emplace_back("captureHandlerWithSample");
+        if (i % 3 == 0) continue;
+        remote->recordingDidPause();
+        sent.emplace_back("recordingDidPause");
+    }
+    EXPECT_TRUE(eventually([&] { return client->messages().size() == sent.size(); }));
+    EXPECT_EQ(client->messages(), sent);
+    EXPECT_EQ(failures, std::vector<std::int64_t>());
+}
+
+TEST(SurfaceReturnsTest, OnlyOneThatIsHeldMayBeLetGoOfQuietly) {
+    SurfaceReturns returns;
+    EXPECT_FALSE(returns.isQuiet());
+    returns.hold();
+    EXPECT_TRUE(returns.isQuiet());
+    returns.hold();
+    EXPECT_FALSE(returns.isQuiet());
+    returns.letGo(1, {});
+    EXPECT_FALSE(returns.isQuiet()) << "one waits";
+    returns.take();
+    EXPECT_TRUE(returns.isQuiet());
+    returns.letGoQuietly();
+    EXPECT_FALSE(returns.isQuiet());
+    EXPECT_EQ(returns.due(), std::nullopt);
+}
+
 TEST(SurfaceReturnsTest, AFewAreToldOfTogether) {
     SurfaceReturns returns;
     for (std::uint32_t serial = 1; serial < SurfaceReturns::kMostTogether; ++serial) {
@@ -213,6 +252,22 @@ TEST(SurfaceCacheTest, KeepsWhatIsUsedAndDropsTheRest) {
     cache.dropUnused(start + 2 * SurfaceCache::kPatience);
     EXPECT_TRUE(cache.empty());
     EXPECT_NE(*cache.open(duplicate(one), geometry, start), first);
+}
+
+TEST(SurfaceCacheTest, FindsWhatItKeepsAndKeepsItForThat) {
+    using Moment = SurfaceCache::Moment;
+    const auto geometry = VideoSurface::Geometry::packed(8, 8);
+    const auto half = VideoSurface::Geometry::packed(4, 8);
+    const VideoSurfaceRef one = *VideoSurface::create(geometry);
+    SurfaceCache cache;
+    EXPECT_EQ(cache.find(one->file(), Moment{}), nullptr);
+    const auto first = *cache.open(UniqueFd(::dup(one->descriptor())), geometry, Moment{});
+    EXPECT_EQ(cache.find(one->file(), Moment{SurfaceCache::kPatience}), first);
+    cache.dropUnused(Moment{SurfaceCache::kPatience});
+    EXPECT_FALSE(cache.empty());
+    const auto second =
+        *cache.open(UniqueFd(::dup(one->descriptor())), half, Moment{SurfaceCache::kPatience * 2});
+    EXPECT_EQ(cache.find(one->file(), Moment{SurfaceCache::kPatience * 2}), second) << "used last";
 }
 
 TEST(SurfaceCacheTest, HoldsNoMoreThanItsBound) {

@@ -248,6 +248,7 @@ TEST_F(MessageBytesTest, FrameThatIsGivenBack) {
     ASSERT_TRUE(test::eventually([&] { return !callbacks->messages().empty(); }));
     callbacks->videoSamples.set({});
     Sheet sheet("frame_given_back");
+    sheet.add("the request for a lane, with the first frame", end.read());
     sheet.add("the answer to captureHandlerWithSample", end.read());
     sheet.compare();
     client->invalidate();
@@ -256,6 +257,7 @@ TEST_F(MessageBytesTest, FrameThatIsGivenBack) {
 TEST_F(MessageBytesTest, EveryErrorAndWhatEveryObjectAnswers) {
     Sheet sheet("standard_answers");
     const std::string ours(interfaceOf<KVDaemonProtocol>()->name);
+    sheet.add("a lane", answerTo(standardCall(dbus::kObjectPath, dbus::kLaneInterface, "Open")));
     sheet.add("no such method", answerTo(standardCall(dbus::kObjectPath, ours, "fly")));
     sheet.add("no such object", answerTo(standardCall("/elsewhere", ours, "pauseRecording")));
     sheet.add("ping", answerTo(standardCall(dbus::kObjectPath, "org.freedesktop.DBus.Peer", "Ping")));

@@ -9,6 +9,9 @@ namespace kelvo::dbus {
 /// The one object that either side of a connection has.
 inline constexpr const char* kObjectPath = "/com/quillon/kelvod";
 
+/// Of the server's object: how a client that is sent frames asks for a shorter way for them.
+inline constexpr const char* kLaneInterface = "com.quillon.kelvod.FrameLane";
+
 /// The D-Bus description of one interface, as it stands in an introspection file.
 std::string interfaceXML(const IPCInterface& interface);
 

@@ -77,6 +77,7 @@ void SocketConnection::handleExportedCall(dbus::Message& message, std::size_t me
     // nobody uses the surfaces any more that came with it.
     const bool isAwaited = message.wantsReply() && description.isOneWay();
     const auto end = isAwaited ? answerAtTheEnd(message.serial) : nullptr;
+    if (end && !message.descriptors.empty()) askForLane();
     auto arguments = readArguments(message, description, end);
     if (!arguments) return cutOff(description.name + ": " + arguments.error().localizedDescription());
     IPCReply reply;
@@ -128,6 +129,7 @@ void SocketConnection::handleStandardCall(const dbus::Message& message) {
             if (message.path == path) return answer(message, "s", {dbus::parentXML(child)});
         }
     }
+    if (message.interface == dbus::kLaneInterface && message.member == "Open") return answerWithLane(message);
     if (message.path != kObjectPath)
         return answerError(message, kUnknownObject, "no object " + std::string(message.path));
     answerError(message, kUnknownMethod, "no method " + call);
@@ -151,13 +153,23 @@ void SocketConnection::answerError(const dbus::Message& call, const char* name, 
 void SocketConnection::handleReply(dbus::Message& message) {
     const auto interface = remoteInterface();
     std::pair<ReplyIdentifier, std::size_t> awaited{0, 0};
-    std::map<std::uint32_t, LentSurfaces>::node_type returned;  // goes back after the lock is free
+    // Go back after the lock is free.
+    std::map<std::uint32_t, LentSurfaces>::node_type returned;
+    LentSurfaces givenBack;
+    bool isLane = false;
     {
         const std::lock_guard lock(outMutex_);
         returned = out_.lent.extract(message.replySerial);
+        if (out_.lane) {
+            out_.lane->takeGivenBack(message.replySerial, givenBack);
+            if (message.type == dbus::MessageType::error && !givenBack.empty()) out_.lane->forgetSurfaces();
+        }
+        isLane = out_.laneRequest != 0 && message.replySerial == out_.laneRequest;
+        if (isLane) out_.laneRequest = 0;
         const auto found = out_.awaited.extract(message.replySerial);
         if (found) awaited = found.mapped();
     }
+    if (isLane) return openLane(message);
     if (awaited.first == 0 || !interface) return;
     if (message.type == dbus::MessageType::error)
         return receivedError(awaited.first, KVError::posix(EPROTO, std::string(message.errorName)));
@@ -172,6 +184,7 @@ OptionalError SocketConnection::transmit(const IPCInterface& interface, std::siz
                                          const Array& arguments, ReplyIdentifier identifier,
                                          const ErrorReport& whenUnsent) {
     const IPCMethod& description = interface.methods[method];
+    if (identifier == 0 && sendByLane(description, method, arguments)) return std::nullopt;
     LentSurfaces lent =
         description.isOneWay() ? surfacesIn(description.arguments, arguments) : LentSurfaces();
     dbus::Message call;
@@ -187,14 +200,13 @@ OptionalError SocketConnection::transmit(const IPCInterface& interface, std::siz
 
 OptionalError SocketConnection::sendCall(dbus::Message& message, ReplyIdentifier identifier,
                                          std::size_t method, LentSurfaces surfaces, ErrorReport whenUnsent) {
+    LentSurfaces givenBack;  // goes back after the lock is free
     std::unique_lock lock(outMutex_);
     // Looked at under the lock: what is queued or lent afterwards would not be found by `close`.
     if (isOver() || cannotSend_) return notConnected();
+    if (!surfaces.empty() && !mayLend(givenBack)) return KVError::posix(EAGAIN, "surface");
     message.serial = nextSerial();
-    if (!surfaces.empty()) {
-        if (out_.lent.size() >= ipc_bounds::kMostLentMessages) return KVError::posix(EAGAIN, "surface");
-        out_.lent.emplace(message.serial, std::move(surfaces));
-    }
+    if (!surfaces.empty()) lend(message.serial, std::move(surfaces));
     if (identifier != 0) out_.awaited[message.serial] = {identifier, method};
     const bool isWithinBounds = push(message, identifier == 0 ? std::move(whenUnsent) : nullptr);
     lock.unlock();

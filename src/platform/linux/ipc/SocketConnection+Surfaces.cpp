@@ -15,27 +15,33 @@ Result<VideoSurfaceRef> SocketConnection::openSurface(UniqueFd descriptor,
 }
 
 /// Answers, with nothing, when its last reference goes.
-std::shared_ptr<void> SocketConnection::answerAtTheEnd(std::uint32_t serial) {
+std::shared_ptr<void> SocketConnection::answerAtTheEnd(std::uint32_t serial,
+                                                       std::optional<std::size_t> place) {
     if (side_ == Side::client) {
         std::unique_lock lock(outMutex_);
         if (out_.returns.hold()) sendReturns(std::move(lock));
     }
     const std::weak_ptr weakSelf = std::static_pointer_cast<SocketConnection>(shared_from_this());
     // What it points to is of no interest, as long as it is something.
-    return {this, [weakSelf, serial](void*) {
+    return {this, [weakSelf, serial, place](void*) {
                 const auto self = weakSelf.lock();
-                if (self && !self->isOver()) self->letGo(serial);
+                if (self && !self->isOver()) self->letGo(serial, place);
             }};
 }
 
-/// Only a client is sent one frame after the other; a server's peer may wait for this very answer.
-void SocketConnection::letGo(std::uint32_t serial) {
+/// Only a client is sent one frame after the other; a server's peer may wait for this very answer. What came
+/// to its `place` of the lane is left there, unless the peer may need it before it sends the next.
+void SocketConnection::letGo(std::uint32_t serial, std::optional<std::size_t> place) {
     if (side_ == Side::server) {
         dbus::Message reply = dbus::Message::replying(dbus::MessageType::reply, serial);
         return sendMessage(reply);
     }
     const Moment now = loop_->now();
     std::unique_lock lock(outMutex_);
+    if (place && out_.returns.isQuiet() && !lane_->hasFront()) {
+        out_.returns.letGoQuietly();
+        return lane_->giveBack(*place, serial);
+    }
     if (!out_.returns.letGo(serial, now)) {
         lock.unlock();
         return loop_->tickAt(now + SurfaceReturns::kPatience);

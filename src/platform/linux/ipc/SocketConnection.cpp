@@ -65,13 +65,20 @@ void SocketConnection::close() {
     if (token_ != 0) loop_->remove(held->get(), token_);
     ::shutdown(held->get(), SHUT_RDWR);
     std::deque<Outgoing> unsent;
-    std::map<std::uint32_t, LentSurfaces> lent;  // goes back to its pools after the lock is free
+    // Go back to their pools after the lock is free.
+    std::map<std::uint32_t, LentSurfaces> lent;
+    std::unique_ptr<FrameLaneSender> lane;
+    std::shared_ptr<FrameLaneReceiver> received;
     {
         const std::lock_guard lock(outMutex_);
+        hasLane_ = false;
+        lane.swap(out_.lane);
+        received = lane_;
         unsent.swap(out_.queue);
         out_.awaited.clear();
         lent.swap(out_.lent);
     }
+    if (received) received->stop();
     reportUnsent(reportsOf(std::move(unsent)));
     if (const Task release = release_.exchange(nullptr)) release();
 }
@@ -139,6 +146,7 @@ void SocketConnection::noteDeadline() {
 std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
     std::optional<Moment> next = returnSurfacesWhenDue(now);
     const auto noteNext = [&next](Moment moment) { next = next ? std::min(*next, moment) : moment; };
+    if (const auto again = takeGivenBackWhenLent(now)) noteNext(*again);
     const std::lock_guard lock(receiveMutex_);
     if (deadline_ && *deadline_ <= now) {
         deadline_.reset();
@@ -146,7 +154,8 @@ std::optional<SocketWatcher::Moment> SocketConnection::tick(Moment now) {
         return std::nullopt;
     }
     if (deadline_) noteNext(*deadline_);
-    surfaces_.dropUnused(now);
+    // One that waits in the lane may need any of them.
+    if (!lane_ || !lane_->hasFront()) surfaces_.dropUnused(now);
     if (!surfaces_.empty()) noteNext(now + SurfaceCache::kPatience);
     return next;
 }
@@ -205,9 +214,8 @@ void SocketConnection::handleReceived() {
             isHeldUp_ = true;
             return;
         }
-        if (isOver() || !handleNextMessage()) break;
+        if (isOver() || !(handleNextOfLane() || handleNextMessage())) break;
         ++messagesThisTurn_;
-        deadline_.reset();
     } while (true);
     if (incoming_.empty() && !receivedDescriptors_.empty() && !isOver())
         cutOff("descriptors that belong to no message");
@@ -248,6 +256,8 @@ bool SocketConnection::handleNextMessage() {
     message->descriptors.assign(std::make_move_iterator(receivedDescriptors_.begin()),
                                 std::make_move_iterator(last));
     receivedDescriptors_.erase(receivedDescriptors_.begin(), last);
+    lastReceived_ = message->serial;
+    deadline_.reset();
     handle(*message);
     incoming_.erase(incoming_.begin(), incoming_.begin() + static_cast<std::ptrdiff_t>(*size));
     return true;

@@ -4,6 +4,8 @@
 #include "platform/linux/files/DeviceRoot.h"
 #include "platform/linux/ipc/Authentication.h"
 #include "platform/linux/ipc/DBusMessage.h"
+#include "platform/linux/ipc/FrameLaneReceiver.h"
+#include "platform/linux/ipc/FrameLaneSender.h"
 #include "platform/linux/ipc/Peer.h"
 #include "platform/linux/ipc/SocketLoop.h"
 #include "platform/linux/ipc/SurfaceLending.h"
@@ -67,6 +69,8 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
         std::map<std::uint32_t, LentSurfaces>
             lent;                // by the serial of the message that the peer has yet to let go
         SurfaceReturns returns;  // what this side has let go of
+        std::unique_ptr<FrameLaneSender> lane;  // a server's
+        std::uint32_t laneRequest = 0;          // a client's: the serial of its request for one
     };
     enum class Flushed { all, some };
     using Socket = std::shared_ptr<UniqueFd>;
@@ -91,8 +95,20 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     Result<Array> readArguments(dbus::Message& message, const IPCMethod& description,
                                 const std::shared_ptr<void>& lease);
     Result<VideoSurfaceRef> openSurface(UniqueFd descriptor, const VideoSurface::Geometry& geometry);
-    std::shared_ptr<void> answerAtTheEnd(std::uint32_t serial);
-    void letGo(std::uint32_t serial);
+    std::shared_ptr<void> answerAtTheEnd(std::uint32_t serial, std::optional<std::size_t> place = {});
+    void letGo(std::uint32_t serial, std::optional<std::size_t> place);
+    // The lane, on a server's side.
+    void answerWithLane(const dbus::Message& call);
+    bool sendByLane(const IPCMethod& description, std::size_t method, const Array& arguments);
+    std::optional<Moment> takeGivenBackWhenLent(Moment now);
+    bool mayLend(LentSurfaces& givenBack);
+    void lend(std::uint32_t serial, LentSurfaces&& surfaces);
+    // On a client's.
+    void askForLane();
+    void openLane(dbus::Message& reply);
+    void laneRang();
+    bool handleNextOfLane();
+    void handleFrame(const FrameLane::Entry& entry, std::size_t place);
     void sendReturns(std::unique_lock<std::mutex> outLock);
     std::optional<Moment> returnSurfacesWhenDue(Moment now);
     IPCReply replyTo(std::uint32_t serial, const IPCMethod& method);
@@ -130,11 +146,15 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     std::optional<dbus::ServerAuthentication> authentication_;
     std::optional<Moment> deadline_;
     SurfaceCache surfaces_;
+    std::uint32_t lastReceived_ = 0;  // serial
+    bool hasAskedForLane_ = false;
+    std::shared_ptr<FrameLaneReceiver> lane_;  // a client's; set once, under `outMutex_` too
 
     std::atomic<bool> isAuthenticated_{false};
     std::atomic<bool> wasLookedAt_{false};  // by the loop
     std::atomic<bool> isHeldUp_{false};     // more was received than may wait
     std::atomic<bool> cannotSend_{false};   // the peer is gone, but what it sent before still counts
+    std::atomic<bool> hasLane_{false};      // a server's
     std::mutex outMutex_;
     Out out_;
 };

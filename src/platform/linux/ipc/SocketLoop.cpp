@@ -23,6 +23,20 @@ constexpr std::size_t kMostThreads = 2;
 /// The loop whose thread the calling one is.
 thread_local const void* loopOfThread = nullptr;
 
+/// What a bell's thread will run.
+struct OwnTask {
+    bool isTaken = false;
+    std::function<void()> task;
+};
+/// The calling thread's, if it is a bell's.
+thread_local OwnTask* ownTaskOfThread = nullptr;
+
+void runInSpareTime(std::function<void()>& task) {
+    if (!task) return;
+    const SpareTime spare;
+    std::exchange(task, nullptr)();
+}
+
 void watchOurs(int epoll, int descriptor, SocketLoop::Token token, std::uint32_t events) {
     epoll_event event{};
     event.events = events;
@@ -94,11 +108,7 @@ struct SocketLoop::Shared {
 
     void runWhatIsLeft() {
         if (runner != std::this_thread::get_id()) return;
-        if (afterwards) {
-            const SpareTime spare;
-            afterwards();
-            afterwards = nullptr;
-        }
+        runInSpareTime(afterwards);
         runner = std::thread::id();
     }
 };
@@ -114,16 +124,25 @@ void SocketLoop::stopThreads() {
     shared_->isStopped = true;
     ::eventfd_write(shared_->wake.get(), 1);
     std::vector<std::thread> threads;
+    std::vector<Attendant> attendants;
     {
         const std::lock_guard lock(startMutex_);
         threads.swap(threads_);
+        attendants.swap(attendants_);
     }
-    for (std::thread& thread : threads) {
-        if (thread.get_id() == std::this_thread::get_id()) {
-            thread.detach();
-        } else {
-            thread.join();
-        }
+    for (const Attendant& each : attendants)
+        each.bell->stop();
+    for (std::thread& thread : threads)
+        end(thread);
+    for (Attendant& each : attendants)
+        end(each.thread);
+}
+
+void SocketLoop::end(std::thread& thread) {
+    if (thread.get_id() == std::this_thread::get_id()) {
+        thread.detach();
+    } else {
+        thread.join();
     }
 }
 
@@ -138,6 +157,21 @@ void SocketLoop::startThread(std::size_t count) {
     const std::lock_guard lock(startMutex_);
     if (threads_.size() < count && !shared_->isStopped)
         threads_.emplace_back([shared = shared_] { run(shared); });
+}
+
+void SocketLoop::attend(const std::shared_ptr<SocketBell>& bell) {
+    const std::lock_guard lock(startMutex_);
+    if (shared_->isStopped) return;
+    std::erase_if(attendants_, [](Attendant& each) {
+        if (!*each.isDone) return false;
+        end(each.thread);
+        return true;
+    });
+    const auto isDone = std::make_shared<std::atomic<bool>>(false);
+    attendants_.push_back({bell, isDone, std::thread([shared = shared_, bell, isDone] {
+                               runAttendant(shared, *bell);
+                               *isDone = true;
+                           })});
 }
 
 SocketLoop::Token SocketLoop::add(int descriptor, std::shared_ptr<SocketWatcher> watcher) {
@@ -182,6 +216,7 @@ void SocketLoop::tickAt(SocketWatcher::Moment moment) {
 
 bool SocketLoop::mayRunAfterwards() {
     if (loopOfThread != shared_.get()) return false;
+    if (ownTaskOfThread != nullptr) return !std::exchange(ownTaskOfThread->isTaken, true);
     std::thread::id nobody;
     if (!shared_->runner.compare_exchange_strong(nobody, std::this_thread::get_id())) return false;
     startThread(kMostThreads);
@@ -189,8 +224,25 @@ bool SocketLoop::mayRunAfterwards() {
 }
 
 void SocketLoop::runAfterwards(std::function<void()> task) {
+    if (ownTaskOfThread != nullptr) {
+        ownTaskOfThread->isTaken = task != nullptr;
+        ownTaskOfThread->task = std::move(task);
+        return;
+    }
     shared_->afterwards = std::move(task);
     if (!shared_->afterwards) shared_->runner = std::thread::id();
+}
+
+void SocketLoop::runAttendant(const std::shared_ptr<Shared>& shared, SocketBell& bell) {
+    nameCurrentThread("com.quillon.kelvod.frames");
+    loopOfThread = shared.get();
+    OwnTask own;
+    ownTaskOfThread = &own;
+    while (bell.wait()) {
+        bell.ready();
+        runInSpareTime(own.task);
+        own.isTaken = false;
+    }
 }
 
 void SocketLoop::run(const std::shared_ptr<Shared>& shared) {

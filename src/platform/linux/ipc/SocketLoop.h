@@ -2,6 +2,7 @@
 
 #include "base/UniqueFd.h"
 
+#include <atomic>
 #include <chrono>
 #include <cstdint>
 #include <functional>
@@ -26,11 +27,25 @@ class SocketWatcher {
     virtual std::optional<Moment> tick(Moment now) = 0;
 };
 
+/// Something that is waited for on a thread of its own, because it is no descriptor.
+class SocketBell {
+  public:
+    virtual ~SocketBell() = default;
+    /// Returns true when there may be something to do, and false once it was stopped. On its thread.
+    virtual bool wait() = 0;
+    /// Does it. On its thread.
+    virtual void ready() = 0;
+    /// Never waits. Any thread.
+    virtual void stop() = 0;
+};
+
 /// The socket work of all connections. It starts with the first watcher and sleeps while nothing happens.
 ///
 /// Two threads wait for sockets. Either may go on to run what a message asks for, because waking one more
 /// thread would cost as much as the whole way of the message; but not while the other one does so: however
 /// long that takes, a thread is left for the sockets. The second one starts when it is first missed.
+///
+/// A bell has a thread for itself, which always goes on to run what is asked for: only that bell waits then.
 /// Thread-safe.
 class SocketLoop {
   public:
@@ -56,20 +71,32 @@ class SocketLoop {
     /// Ticks every watcher at `moment` or soon after.
     void tickAt(SocketWatcher::Moment moment);
 
-    /// From `ready`: whether the thread may run a task once it is done with all that was ready; never on any
-    /// other thread. True obliges the caller to `runAfterwards`, with nothing if it has no task after all.
+    /// Waits for a bell, until that is stopped or the loop is.
+    void attend(const std::shared_ptr<SocketBell>& bell);
+
+    /// From a watcher's or a bell's `ready`: whether the thread may run a task once it is done with all that
+    /// was ready; never on any other thread. True obliges the caller to `runAfterwards`, with nothing if it
+    /// has no task after all.
     bool mayRunAfterwards();
     void runAfterwards(std::function<void()> task);
 
   private:
     struct Shared;
+    struct Attendant {
+        std::shared_ptr<SocketBell> bell;
+        std::shared_ptr<std::atomic<bool>> isDone;
+        std::thread thread;
+    };
     static void run(const std::shared_ptr<Shared>& shared);
+    static void runAttendant(const std::shared_ptr<Shared>& shared, SocketBell& bell);
+    static void end(std::thread& thread);
     void startThread(std::size_t count);
     void stopThreads();
 
     const std::shared_ptr<Shared> shared_;
     std::mutex startMutex_;
     std::vector<std::thread> threads_;
+    std::vector<Attendant> attendants_;
 };
 
 }  // namespace kelvo
