@@ -5,6 +5,7 @@
 #include <string>
 #include <sys/mman.h>
 #include <sys/stat.h>
+#include <typeinfo>
 
 namespace kelvo {
 namespace {
@@ -68,6 +69,12 @@ Result<VideoSurfaceRef> VideoSurface::fromDescriptor(UniqueFd descriptor, const 
     if (!geometry.isValid()) return KVError::posix(EINVAL, "surface geometry");
     if (auto error = checkForeignFile(descriptor.get(), geometry.byteCount())) return *error;
     return map(std::move(descriptor), geometry, false);
+}
+
+VideoSurfaceRef VideoSurface::fromHandle(const std::shared_ptr<ObjectHandle>& handle) {
+    if (!handle) return nullptr;
+    const ObjectHandle& object = *handle;
+    return typeid(object) == typeid(VideoSurface) ? std::static_pointer_cast<VideoSurface>(handle) : nullptr;
 }
 
 Result<VideoSurfaceRef> VideoSurface::map(UniqueFd descriptor, const Geometry& geometry, bool isWritable) {

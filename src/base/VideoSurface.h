@@ -16,7 +16,7 @@ namespace kelvo {
 
 /// The picture of one video frame in a memory file that another process can map. Pixels never travel in
 /// messages: the descriptor does. Thread-safe as far as its pixels are not written while somebody reads them.
-class VideoSurface : public ObjectHandle {
+class VideoSurface final : public ObjectHandle {
   public:
     enum class PixelFormat : std::uint32_t {
         BGRx = fourCharacterCode("BGRx"),  ///< 4 bytes a pixel: blue, green, red, unused
@@ -58,6 +58,10 @@ class VideoSurface : public ObjectHandle {
     /// behind `descriptor` is smaller than the geometry says or could still shrink.
     static Result<std::shared_ptr<VideoSurface>> fromDescriptor(UniqueFd descriptor,
                                                                 const Geometry& geometry);
+
+    /// The surface behind a handle; none when there is something else, or nothing. Done for every frame, for
+    /// which a dynamic cast takes long.
+    static std::shared_ptr<VideoSurface> fromHandle(const std::shared_ptr<ObjectHandle>& handle);
 
     ~VideoSurface() override;
 

@@ -25,7 +25,7 @@ struct KVIOSurfaceObjectCoding {
         KVIOSurfaceObject object;
         const Value* entry = coder.isIPCCoder() ? coder.decode(kSurfaceKey) : nullptr;
         const auto* handle = entry != nullptr ? entry->template as<std::shared_ptr<ObjectHandle>>() : nullptr;
-        if (handle != nullptr) object.setIOSurface(std::dynamic_pointer_cast<VideoSurface>(*handle));
+        if (handle != nullptr) object.setIOSurface(VideoSurface::fromHandle(*handle));
         return object;
     }
 

@@ -86,6 +86,25 @@ TEST(VideoSurfaceTest, OtherSideSeesThePixelsOfOneMemoryFile) {
     EXPECT_EQ((*theirs)->pixels()[5], std::byte{9});
 }
 
+TEST(VideoSurfaceTest, FileTellsSurfacesApartInEveryProcess) {
+    const auto surface = *VideoSurface::create(VideoSurface::Geometry::packed(4, 4));
+    const auto another = *VideoSurface::create(VideoSurface::Geometry::packed(4, 4));
+    const auto sameFile = *VideoSurface::fromDescriptor(UniqueFd(::dup(surface->descriptor())),
+                                                        VideoSurface::Geometry::packed(2, 4));
+    EXPECT_EQ(surface->file(), sameFile->file());
+    EXPECT_NE(surface->file(), another->file());
+    EXPECT_EQ(VideoSurface::fileOf(surface->descriptor()), surface->file());
+    EXPECT_EQ(VideoSurface::fileOf(-1), std::nullopt);
+}
+
+TEST(VideoSurfaceTest, HandleKnowsWhetherItIsASurface) {
+    struct Other : ObjectHandle {};
+    const auto surface = *VideoSurface::create(VideoSurface::Geometry::packed(4, 4));
+    EXPECT_EQ(VideoSurface::fromHandle(surface), surface);
+    EXPECT_EQ(VideoSurface::fromHandle(std::make_shared<Other>()), nullptr);
+    EXPECT_EQ(VideoSurface::fromHandle(nullptr), nullptr);
+}
+
 TEST(VideoSurfaceTest, SurfaceOfSomebodyElseIsReadOnly) {
     const auto theirs = VideoSurface::fromDescriptor(memoryFile(32, F_SEAL_SHRINK), kSmall);
     ASSERT_TRUE(theirs);

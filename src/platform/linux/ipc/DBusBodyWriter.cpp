@@ -148,7 +148,7 @@ class BodyWriter {
     }
     bool writeSurface(const Value& value) {
         const auto* handle = value.as<std::shared_ptr<ObjectHandle>>();
-        const auto surface = handle != nullptr ? std::dynamic_pointer_cast<VideoSurface>(*handle) : nullptr;
+        const auto surface = handle != nullptr ? VideoSurface::fromHandle(*handle) : nullptr;
         if (!surface) return false;
         surface->keepOutNewWriters();
         const VideoSurface::Geometry& geometry = surface->geometry();
