@@ -99,18 +99,6 @@ void Recorder::Core::lookAgain(std::chrono::milliseconds pause) {
     });
 }
 
-void Recorder::Core::post(std::function<void()> task) {
-    environment_.executor([weakSelf = weak_from_this(), task = std::move(task)]() mutable {
-        if (const auto self = weakSelf.lock()) self->run(task);
-        task = nullptr;  // what it holds, a frame perhaps, goes on the executor
-    });
-}
-
-void Recorder::Core::run(const std::function<void()>& task) {
-    const std::lock_guard lock(running_);
-    if (!isShutDown_) task();
-}
-
 template <typename Handler, typename... Arguments>
 void Recorder::Core::notify(Handler RecorderHandlers::*handler, Arguments... arguments) {
     post([this, handler, ... arguments = std::move(arguments)] {

@@ -105,8 +105,8 @@ class Recorder::Core : public kelvo::KVClientProtocol, public std::enable_shared
     void lookAgain(std::chrono::milliseconds pause);
 
     /// Runs a task on the executor, unless the recorder has gone by then.
-    void post(std::function<void()> task);
-    void run(const std::function<void()>& task);
+    template <typename Work>
+    void post(Work work);
     /// Calls one of the handlers, as it is then, on the executor.
     template <typename Handler, typename... Arguments>
     void notify(Handler RecorderHandlers::*handler, Arguments... arguments);
@@ -124,6 +124,17 @@ class Recorder::Core : public kelvo::KVClientProtocol, public std::enable_shared
     std::recursive_mutex running_;  ///< held while a handler runs: whoever shuts down waits for it
     std::atomic<bool> isShutDown_{false};
 };
+
+template <typename Work>
+void Recorder::Core::post(Work work) {
+    environment_.executor([weakSelf = weak_from_this(), work = std::move(work)]() mutable {
+        const Work task = std::move(work);  // what it holds, a frame perhaps, goes on the executor
+        const auto self = weakSelf.lock();
+        if (!self) return;
+        const std::lock_guard lock(self->running_);
+        if (!self->isShutDown_) task();
+    });
+}
 
 /// Gives tests a recorder in an environment of theirs.
 struct RecorderTestAccess {
