@@ -55,6 +55,8 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     /// but that it may be called more than once and after the end: that is seen to here. A peer that waits
     /// for too many replies is cut off instead.
     void received(std::size_t method, Array arguments, IPCReply reply, WaitingCost cost = {1, 0, 0});
+    /// Serves such a message then and there. Only in a turn of the connection's queue.
+    void serve(std::size_t method, const Array& arguments, const IPCReply& reply);
     /// The reply arrived to what was sent with this identifier; an unknown one is ignored.
     void receivedReply(ReplyIdentifier identifier, Array values);
     /// The peer could not serve it.
@@ -113,7 +115,6 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     OptionalError trySend(std::size_t method, const Array& arguments, AwaitedReply awaited);
     AwaitedReply takeAwaited(ReplyIdentifier identifier);
     IPCReply owed(IPCReply reply) const;
-    void serve(std::size_t method, const Array& arguments, const IPCReply& reply);
     void openGate();
     void queueHandlers(State state);
     void runHandlers(State state);

@@ -8,6 +8,7 @@
 
 #include <array>
 #include <functional>
+#include <pthread.h>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -141,6 +142,25 @@ TEST_F(FrameLaneClientTest, FramesOfTheLaneArriveWithTheirPixels) {
     EXPECT_EQ(samples[1].surface->ioSurface()->pixels()[5], std::byte{6});
     EXPECT_EQ(samples[1].surface->ioSurface()->pixels().data(),
               samples[0].surface->ioSurface()->pixels().data());
+}
+
+/// The first ones may come while the thread starts; then whoever opens the lane serves them.
+TEST_F(FrameLaneClientTest, FrameIsServedByTheThreadThatWaitsForIt) {
+    Guarded<std::string> thread;
+    callbacks->onMessage = [&](const std::string&) {
+        std::array<char, 16> name{};
+        ::pthread_getname_np(::pthread_self(), name.data(), name.size());
+        thread.set(name.data());
+    };
+    becomeReady();
+    for (std::size_t frames = 2; thread.copy() != "n.kelvod.frames"; ++frames) {
+        ASSERT_LT(frames, FrameLane::kPlaces);
+        put();
+        lane.ring();
+        ASSERT_TRUE(eventually([&] { return callbacks->messages().size() == frames; }));
+    }
+    client->invalidate();
+    loop->stop();
 }
 
 TEST_F(FrameLaneClientTest, FramesAndMessagesKeepTheirOrder) {

@@ -1,4 +1,4 @@
-#include "base/KVLog.h"
+#include "base/SpareTime.h"
 #include "platform/IPCBounds.h"
 #include "platform/linux/ipc/Introspection.h"
 #include "platform/linux/ipc/SocketConnection.h"
@@ -59,7 +59,7 @@ void SocketConnection::answerWithLane(const dbus::Message& call) {
 /// False when it has to go as a message.
 bool SocketConnection::sendByLane(const IPCMethod& description, std::size_t method, const Array& arguments) {
     if (!hasLane_ || !isFrame(description) || arguments.size() != 2) return false;
-    auto surface = std::dynamic_pointer_cast<VideoSurface>(surfaceIn(description.arguments[0], arguments[0]));
+    auto surface = VideoSurface::fromHandle(surfaceIn(description.arguments[0], arguments[0]));
     const Bytes* bytes = arguments[1].as<Bytes>();
     if (!surface || bytes == nullptr) return false;
     const Moment now = loop_->now();
@@ -89,7 +89,7 @@ bool SocketConnection::mayLend(LentSurfaces& givenBack) {
 void SocketConnection::lend(std::uint32_t serial, LentSurfaces&& surfaces) {
     if (out_.lane) {
         for (const auto& each : surfaces) {
-            if (const auto* surface = dynamic_cast<const VideoSurface*>(each.get()))
+            if (const auto surface = VideoSurface::fromHandle(each))
                 out_.lane->sentInMessage(*surface, loop_->now());
         }
     }
@@ -142,40 +142,98 @@ void SocketConnection::openLane(dbus::Message& reply) {
 }
 
 void SocketConnection::laneRang() {
-    const std::lock_guard lock(receiveMutex_);
-    if (!socket()) return;
-    isHeldUp_ = false;
-    messagesThisTurn_ = 0;
-    handleReceived();
-    if (isHeldUp_ && !isOver()) arm();
+    while (lane_->hasFront()) {
+        if (serveNextOfLane()) continue;
+        const std::lock_guard lock(receiveMutex_);
+        if (!socket()) return;
+        isHeldUp_ = false;
+        messagesThisTurn_ = 0;
+        handleReceived();
+        if (isHeldUp_ && !isOver()) arm();
+        return;
+    }
 }
 
-/// Handles the frame at the front of the lane, if what was sent before it has been handled. What was sent
-/// after it waits for it.
+/// Serves the frame at the front on this thread, if it is its turn. Then nothing need be put by for later,
+/// which would take longer than all the rest.
+bool SocketConnection::serveNextOfLane() {
+    const SpareTime spare;  // what the frame leaves to be done is done when its turn is over
+    std::unique_lock lock(receiveMutex_);
+    // Under the lock, so that what was received before has been served.
+    if (!socket() || !queue().tryTakeTurn()) return false;
+    const std::optional<Frame> frame = takeFrame();
+    lock.unlock();
+    queue().runInTurn([&] {
+        if (frame) serve(frame->method, frame->arguments, nullptr);
+    });
+    return frame.has_value();
+}
+
 bool SocketConnection::handleNextOfLane() {
-    if (!lane_ || !lane_->hasFront()) return false;
-    const FrameLane::Entry entry = lane_->front();
-    const auto ahead = static_cast<std::int32_t>(entry.serial - after(lastReceived_));
-    if (ahead > 0) return false;
-    lastReceived_ = entry.serial;
-    handleFrame(entry, lane_->takeFront());
+    if (!lane_) return false;
+    std::optional<Frame> frame = takeFrame();
+    if (!frame) return false;
+    received(frame->method, std::move(frame->arguments), nullptr);
     return true;
 }
 
-void SocketConnection::handleFrame(const FrameLane::Entry& entry, std::size_t place) {
+/// Takes the frame at the front of the lane, if what was sent before it has been received. What was sent
+/// after it waits for it.
+std::optional<SocketConnection::Frame> SocketConnection::takeFrame() {
+    while (!isOver() && lane_->hasFront()) {
+        const FrameLane::Entry entry = lane_->front();
+        const auto ahead = static_cast<std::int32_t>(entry.serial - after(lastReceived_));
+        if (ahead > 0) break;
+        lastReceived_ = entry.serial;
+        if (auto frame = frameOf(entry, lane_->takeFront())) return frame;
+    }
+    return std::nullopt;
+}
+
+/// Gives a frame's place back when the last reference to its surface goes.
+class SocketConnection::FrameLoan {
+  public:
+    FrameLoan(std::weak_ptr<SocketConnection> connection, std::uint32_t serial, std::size_t place,
+              VideoSurfaceRef surface)
+        : connection_(std::move(connection)), serial_(serial), place_(place), surface_(std::move(surface)) {}
+    ~FrameLoan() {
+        const auto connection = connection_.lock();
+        if (connection && !connection->isOver()) connection->letGo(serial_, place_);
+    }
+    FrameLoan(const FrameLoan&) = delete;
+    FrameLoan& operator=(const FrameLoan&) = delete;
+
+  private:
+    const std::weak_ptr<SocketConnection> connection_;
+    const std::uint32_t serial_;
+    const std::size_t place_;
+    const VideoSurfaceRef surface_;
+};
+
+/// None when the surface is not there any more, which the daemon is told, or when it is no frame.
+std::optional<SocketConnection::Frame> SocketConnection::frameOf(const FrameLane::Entry& entry,
+                                                                 std::size_t place) {
     const auto interface = exportedInterface();
     if (!interface || entry.method >= interface->methods.size() ||
-        !isFrame(interface->methods[entry.method]) || entry.size > entry.bytes.size())
-        return cutOff("frame that is none");
-    const VideoSurfaceRef surface = surfaces_.find(entry.surface, loop_->now());
+        !isFrame(interface->methods[entry.method]) || entry.size > entry.bytes.size()) {
+        cutOff("frame that is none");
+        return std::nullopt;
+    }
+    VideoSurfaceRef surface = surfaces_.find(entry.surface, loop_->now());
     if (!surface) {
         dbus::Message error = dbus::Message::replying(dbus::MessageType::error, entry.serial);
         error.errorName = kUnknownSurface;
-        return sendMessage(error);
+        sendMessage(error);
+        return std::nullopt;
     }
-    const std::shared_ptr<ObjectHandle> lent = tiedTo(answerAtTheEnd(entry.serial, place), surface);
+    holdSurfaces();
+    VideoSurface* const pixels = surface.get();
+    const auto loan =
+        std::make_shared<FrameLoan>(std::static_pointer_cast<SocketConnection>(shared_from_this()),
+                                    entry.serial, place, std::move(surface));
     const auto bytes = std::span(entry.bytes).first(entry.size);
-    received(entry.method, {Array{lent}, Bytes(bytes.begin(), bytes.end())}, nullptr, {1, entry.size, 0});
+    return Frame{entry.method,
+                 {Array{std::shared_ptr<ObjectHandle>(loan, pixels)}, Bytes(bytes.begin(), bytes.end())}};
 }
 
 }  // namespace kelvo

@@ -15,18 +15,20 @@ Result<VideoSurfaceRef> SocketConnection::openSurface(UniqueFd descriptor,
 }
 
 /// Answers, with nothing, when its last reference goes.
-std::shared_ptr<void> SocketConnection::answerAtTheEnd(std::uint32_t serial,
-                                                       std::optional<std::size_t> place) {
-    if (side_ == Side::client) {
-        std::unique_lock lock(outMutex_);
-        if (out_.returns.hold()) sendReturns(std::move(lock));
-    }
+std::shared_ptr<void> SocketConnection::answerAtTheEnd(std::uint32_t serial) {
+    if (side_ == Side::client) holdSurfaces();
     const std::weak_ptr weakSelf = std::static_pointer_cast<SocketConnection>(shared_from_this());
     // What it points to is of no interest, as long as it is something.
-    return {this, [weakSelf, serial, place](void*) {
+    return {this, [weakSelf, serial](void*) {
                 const auto self = weakSelf.lock();
-                if (self && !self->isOver()) self->letGo(serial, place);
+                if (self && !self->isOver()) self->letGo(serial);
             }};
+}
+
+/// Of one message more.
+void SocketConnection::holdSurfaces() {
+    std::unique_lock lock(outMutex_);
+    if (out_.returns.hold()) sendReturns(std::move(lock));
 }
 
 /// Only a client is sent one frame after the other; a server's peer may wait for this very answer. What came

@@ -95,8 +95,9 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     Result<Array> readArguments(dbus::Message& message, const IPCMethod& description,
                                 const std::shared_ptr<void>& lease);
     Result<VideoSurfaceRef> openSurface(UniqueFd descriptor, const VideoSurface::Geometry& geometry);
-    std::shared_ptr<void> answerAtTheEnd(std::uint32_t serial, std::optional<std::size_t> place = {});
-    void letGo(std::uint32_t serial, std::optional<std::size_t> place);
+    std::shared_ptr<void> answerAtTheEnd(std::uint32_t serial);
+    void holdSurfaces();
+    void letGo(std::uint32_t serial, std::optional<std::size_t> place = {});
     // The lane, on a server's side.
     void answerWithLane(const dbus::Message& call);
     bool sendByLane(const IPCMethod& description, std::size_t method, const Array& arguments);
@@ -106,9 +107,17 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     // On a client's.
     void askForLane();
     void openLane(dbus::Message& reply);
+    /// A frame on its way to whoever serves it.
+    struct Frame {
+        std::size_t method;
+        Array arguments;
+    };
+    class FrameLoan;
     void laneRang();
+    bool serveNextOfLane();
     bool handleNextOfLane();
-    void handleFrame(const FrameLane::Entry& entry, std::size_t place);
+    std::optional<Frame> takeFrame();
+    std::optional<Frame> frameOf(const FrameLane::Entry& entry, std::size_t place);
     void sendReturns(std::unique_lock<std::mutex> outLock);
     std::optional<Moment> returnSurfacesWhenDue(Moment now);
     IPCReply replyTo(std::uint32_t serial, const IPCMethod& method);

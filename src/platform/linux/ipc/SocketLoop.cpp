@@ -23,20 +23,6 @@ constexpr std::size_t kMostThreads = 2;
 /// The loop whose thread the calling one is.
 thread_local const void* loopOfThread = nullptr;
 
-/// What a bell's thread will run.
-struct OwnTask {
-    bool isTaken = false;
-    std::function<void()> task;
-};
-/// The calling thread's, if it is a bell's.
-thread_local OwnTask* ownTaskOfThread = nullptr;
-
-void runInSpareTime(std::function<void()>& task) {
-    if (!task) return;
-    const SpareTime spare;
-    std::exchange(task, nullptr)();
-}
-
 void watchOurs(int epoll, int descriptor, SocketLoop::Token token, std::uint32_t events) {
     epoll_event event{};
     event.events = events;
@@ -66,6 +52,8 @@ struct SocketLoop::Shared {
     /// The thread that runs a task, or will; and the task, which is that thread's own.
     std::atomic<std::thread::id> runner{};
     std::function<void()> afterwards;
+    std::mutex attendantsMutex;
+    std::map<std::shared_ptr<SocketBell>, std::thread> attendants;
 
     std::shared_ptr<SocketWatcher> watcher(Token token) {
         const std::lock_guard lock(mutex);
@@ -108,7 +96,11 @@ struct SocketLoop::Shared {
 
     void runWhatIsLeft() {
         if (runner != std::this_thread::get_id()) return;
-        runInSpareTime(afterwards);
+        if (afterwards) {
+            const SpareTime spare;
+            afterwards();
+            afterwards = nullptr;
+        }
         runner = std::thread::id();
     }
 };
@@ -124,18 +116,21 @@ void SocketLoop::stopThreads() {
     shared_->isStopped = true;
     ::eventfd_write(shared_->wake.get(), 1);
     std::vector<std::thread> threads;
-    std::vector<Attendant> attendants;
+    std::map<std::shared_ptr<SocketBell>, std::thread> attendants;
     {
         const std::lock_guard lock(startMutex_);
         threads.swap(threads_);
-        attendants.swap(attendants_);
     }
-    for (const Attendant& each : attendants)
-        each.bell->stop();
+    {
+        const std::lock_guard lock(shared_->attendantsMutex);
+        attendants.swap(shared_->attendants);
+    }
+    for (const auto& [bell, thread] : attendants)
+        bell->stop();
     for (std::thread& thread : threads)
         end(thread);
-    for (Attendant& each : attendants)
-        end(each.thread);
+    for (auto& [bell, thread] : attendants)
+        end(thread);
 }
 
 void SocketLoop::end(std::thread& thread) {
@@ -160,18 +155,15 @@ void SocketLoop::startThread(std::size_t count) {
 }
 
 void SocketLoop::attend(const std::shared_ptr<SocketBell>& bell) {
-    const std::lock_guard lock(startMutex_);
+    const std::lock_guard lock(shared_->attendantsMutex);
     if (shared_->isStopped) return;
-    std::erase_if(attendants_, [](Attendant& each) {
-        if (!*each.isDone) return false;
-        end(each.thread);
-        return true;
+    shared_->attendants[bell] = std::thread([shared = shared_, bell] {
+        attendTo(*bell);
+        // Nobody waits for it, unless that is the loop that ends.
+        const std::lock_guard innerLock(shared->attendantsMutex);
+        const auto own = shared->attendants.extract(bell);
+        if (own) own.mapped().detach();
     });
-    const auto isDone = std::make_shared<std::atomic<bool>>(false);
-    attendants_.push_back({bell, isDone, std::thread([shared = shared_, bell, isDone] {
-                               runAttendant(shared, *bell);
-                               *isDone = true;
-                           })});
 }
 
 SocketLoop::Token SocketLoop::add(int descriptor, std::shared_ptr<SocketWatcher> watcher) {
@@ -216,7 +208,6 @@ void SocketLoop::tickAt(SocketWatcher::Moment moment) {
 
 bool SocketLoop::mayRunAfterwards() {
     if (loopOfThread != shared_.get()) return false;
-    if (ownTaskOfThread != nullptr) return !std::exchange(ownTaskOfThread->isTaken, true);
     std::thread::id nobody;
     if (!shared_->runner.compare_exchange_strong(nobody, std::this_thread::get_id())) return false;
     startThread(kMostThreads);
@@ -224,25 +215,14 @@ bool SocketLoop::mayRunAfterwards() {
 }
 
 void SocketLoop::runAfterwards(std::function<void()> task) {
-    if (ownTaskOfThread != nullptr) {
-        ownTaskOfThread->isTaken = task != nullptr;
-        ownTaskOfThread->task = std::move(task);
-        return;
-    }
     shared_->afterwards = std::move(task);
     if (!shared_->afterwards) shared_->runner = std::thread::id();
 }
 
-void SocketLoop::runAttendant(const std::shared_ptr<Shared>& shared, SocketBell& bell) {
+void SocketLoop::attendTo(SocketBell& bell) {
     nameCurrentThread("com.quillon.kelvod.frames");
-    loopOfThread = shared.get();
-    OwnTask own;
-    ownTaskOfThread = &own;
-    while (bell.wait()) {
+    while (bell.wait())
         bell.ready();
-        runInSpareTime(own.task);
-        own.isTaken = false;
-    }
 }
 
 void SocketLoop::run(const std::shared_ptr<Shared>& shared) {

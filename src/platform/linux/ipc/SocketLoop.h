@@ -2,7 +2,6 @@
 
 #include "base/UniqueFd.h"
 
-#include <atomic>
 #include <chrono>
 #include <cstdint>
 #include <functional>
@@ -44,8 +43,6 @@ class SocketBell {
 /// Two threads wait for sockets. Either may go on to run what a message asks for, because waking one more
 /// thread would cost as much as the whole way of the message; but not while the other one does so: however
 /// long that takes, a thread is left for the sockets. The second one starts when it is first missed.
-///
-/// A bell has a thread for itself, which always goes on to run what is asked for: only that bell waits then.
 /// Thread-safe.
 class SocketLoop {
   public:
@@ -74,21 +71,16 @@ class SocketLoop {
     /// Waits for a bell, until that is stopped or the loop is.
     void attend(const std::shared_ptr<SocketBell>& bell);
 
-    /// From a watcher's or a bell's `ready`: whether the thread may run a task once it is done with all that
-    /// was ready; never on any other thread. True obliges the caller to `runAfterwards`, with nothing if it
+    /// From `ready` of a watcher: whether the thread may run a task once it is done with all that was ready;
+    /// never on any other thread. True obliges the caller to `runAfterwards`, with nothing if it
     /// has no task after all.
     bool mayRunAfterwards();
     void runAfterwards(std::function<void()> task);
 
   private:
     struct Shared;
-    struct Attendant {
-        std::shared_ptr<SocketBell> bell;
-        std::shared_ptr<std::atomic<bool>> isDone;
-        std::thread thread;
-    };
     static void run(const std::shared_ptr<Shared>& shared);
-    static void runAttendant(const std::shared_ptr<Shared>& shared, SocketBell& bell);
+    static void attendTo(SocketBell& bell);
     static void end(std::thread& thread);
     void startThread(std::size_t count);
     void stopThreads();
@@ -96,7 +88,6 @@ class SocketLoop {
     const std::shared_ptr<Shared> shared_;
     std::mutex startMutex_;
     std::vector<std::thread> threads_;
-    std::vector<Attendant> attendants_;
 };
 
 }  // namespace kelvo
