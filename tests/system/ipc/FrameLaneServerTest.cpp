@@ -52,9 +52,9 @@ class FrameLaneServerTest : public testing::Test {
         return client->read();
     }
     void openLane() {
-        const WireMessage reply = askForLane();
+        WireMessage reply = askForLane();
         ASSERT_EQ(reply.descriptors.size(), 1U);
-        lane = *FrameLane::fromDescriptor(reply.descriptors.front());
+        lane = *FrameLane::fromDescriptor(std::move(reply.descriptors.front()));
     }
     void send(VideoSurfaceRef picture) {
         const auto object = std::make_shared<KVIOSurfaceObject>();

@@ -57,16 +57,14 @@ Result<FrameLane> FrameLane::create() {
     return lane;
 }
 
-Result<FrameLane> FrameLane::fromDescriptor(const UniqueFd& descriptor) {
+Result<FrameLane> FrameLane::fromDescriptor(UniqueFd descriptor) {
     struct stat status {};
     if (::fstat(descriptor.get(), &status) != 0) return systemError("frame lane");
     const int seals = ::fcntl(descriptor.get(), F_GET_SEALS);
     const bool isFixed = seals >= 0 && (seals & F_SEAL_SHRINK) != 0;
     if (!isFixed || status.st_size < static_cast<off_t>(sizeof(Shared)))
         return KVError::posix(EINVAL, "no frame lane");
-    UniqueFd own(::fcntl(descriptor.get(), F_DUPFD_CLOEXEC, 0));
-    if (!own) return systemError("frame lane");
-    return map(std::move(own));
+    return map(std::move(descriptor));
 }
 
 Result<FrameLane> FrameLane::map(UniqueFd descriptor) {

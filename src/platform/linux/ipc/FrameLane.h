@@ -36,7 +36,7 @@ class FrameLane {
     /// A new lane, for the daemon. Fails when memory or descriptors run out.
     static Result<FrameLane> create();
     /// The client's end of one. Fails when it is too small, or could still shrink.
-    static Result<FrameLane> fromDescriptor(const UniqueFd& descriptor);
+    static Result<FrameLane> fromDescriptor(UniqueFd descriptor);
 
     /// What the client maps.
     int descriptor() const { return page_->descriptor.get(); }

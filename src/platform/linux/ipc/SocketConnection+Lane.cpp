@@ -127,7 +127,7 @@ void SocketConnection::askForLane() {
 void SocketConnection::openLane(dbus::Message& reply) {
     if (reply.type == dbus::MessageType::error) return;
     if (reply.signature != "h" || reply.descriptors.size() != 1) return cutOff("reply of another signature");
-    auto lane = FrameLane::fromDescriptor(reply.descriptors.front());
+    auto lane = FrameLane::fromDescriptor(std::move(reply.descriptors.front()));
     if (!lane) return cutOff(lane.error().localizedDescription());
     const std::weak_ptr weakSelf = std::static_pointer_cast<SocketConnection>(shared_from_this());
     const auto receiver = std::make_shared<FrameLaneReceiver>(std::move(*lane), [weakSelf] {
