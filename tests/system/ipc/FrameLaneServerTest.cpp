@@ -76,9 +76,17 @@ class FrameLaneServerTest : public testing::Test {
         if (type == dbus::MessageType::error) reply.errorName = "com.example.Any";
         client->write(dbus::serialize(reply));
     }
-    bool comesBack(VideoSurfacePool& from) {
+    bool comesBack() {
         VideoSurfaceRef again;
-        return eventually([&] { return (again = *from.take()) != nullptr; });
+        return eventually([&] { return (again = *pool.take()) != nullptr; });
+    }
+    /// The pool's one surface: in a message, which gives it back, and then by the lane.
+    void sendByLane() {
+        send(*pool.take());
+        giveBackByMessage(readFrame());
+        ASSERT_TRUE(comesBack());
+        send(*pool.take());
+        ASSERT_TRUE(lane->hasEntry(0));
     }
     /// With the lane open, and the surface sent once.
     void becomeReady() {
@@ -93,6 +101,7 @@ class FrameLaneServerTest : public testing::Test {
         return std::chrono::steady_clock::now() + std::chrono::milliseconds(*ahead);
     });
     const VideoSurfaceRef surface = *VideoSurface::create(VideoSurface::Geometry::packed(8, 8));
+    VideoSurfacePool pool{VideoSurface::Geometry::packed(8, 8), 1};
     std::unique_ptr<RawSocket> client;
     std::shared_ptr<SocketConnection> server;
     std::unique_ptr<RemoteClient> remote;
@@ -150,13 +159,8 @@ TEST_F(FrameLaneServerTest, SurfaceThatTheClientMayHaveDroppedGoesInAMessage) {
 }
 
 TEST_F(FrameLaneServerTest, FrameThatIsGivenBackInTheLaneComesBackWithTheNextOne) {
-    VideoSurfacePool pool(VideoSurface::Geometry::packed(8, 8), 1);
-    openLane();
-    send(*pool.take());
-    giveBackByMessage(readFrame());
-    ASSERT_TRUE(comesBack(pool));
-    send(*pool.take());
-    ASSERT_TRUE(lane->hasEntry(0));
+    becomeReady();
+    sendByLane();
     lane->giveBack(0, lane->entry(0).serial);
     EXPECT_EQ(*pool.take(), nullptr) << "the daemon has not looked yet";
     send(surface);
@@ -164,26 +168,17 @@ TEST_F(FrameLaneServerTest, FrameThatIsGivenBackInTheLaneComesBackWithTheNextOne
 }
 
 TEST_F(FrameLaneServerTest, FrameThatIsGivenBackInTheLaneComesBackAfterAWhileWithoutANextOne) {
-    VideoSurfacePool pool(VideoSurface::Geometry::packed(8, 8), 1);
-    openLane();
-    send(*pool.take());
-    giveBackByMessage(readFrame());
-    ASSERT_TRUE(comesBack(pool));
-    send(*pool.take());
-    ASSERT_TRUE(lane->hasEntry(0));
+    becomeReady();
+    sendByLane();
     lane->giveBack(0, lane->entry(0).serial);
-    EXPECT_TRUE(comesBack(pool));
+    EXPECT_TRUE(comesBack());
 }
 
 TEST_F(FrameLaneServerTest, FrameOfTheLaneMayBeGivenBackByAMessage) {
-    VideoSurfacePool pool(VideoSurface::Geometry::packed(8, 8), 1);
-    openLane();
-    send(*pool.take());
-    giveBackByMessage(readFrame());
-    ASSERT_TRUE(comesBack(pool));
-    send(*pool.take());
+    becomeReady();
+    sendByLane();
     giveBackByMessage(lane->entry(0).serial);
-    EXPECT_TRUE(comesBack(pool));
+    EXPECT_TRUE(comesBack());
 }
 
 TEST_F(FrameLaneServerTest, ClientThatHasNotTheSurfaceGetsMessagesAgain) {

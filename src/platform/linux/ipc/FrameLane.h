@@ -24,8 +24,8 @@ class FrameLane {
     /// Bytes that go with a frame: a timing record is 72.
     static constexpr std::size_t kMostBytes = 96;
 
-    /// What is told of one frame.
-    struct Entry {
+    /// What is told of one frame. Laid out alike on processors of 32 and of 64 bits.
+    struct alignas(8) Entry {
         std::uint32_t serial = 0;  ///< among the messages of the connection, which are in one order with it
         std::uint32_t method = 0;  ///< its place in the client's interface
         VideoSurface::File surface{};
