@@ -3,13 +3,14 @@
 #include "session/RecordingSession.h"
 #include "support/FakeClientProxy.h"
 
+#include <atomic>
 #include <utility>
 #include <vector>
 
 namespace kelvo::test {
 
 /// A session that does nothing by itself: a test says what it is, and finishes it when it likes. On one
-/// thread.
+/// thread, but for whether it is recording.
 class FakeRecordingSession : public RecordingSession {
   public:
     struct Clip {
@@ -152,7 +153,7 @@ class FakeRecordingSession : public RecordingSession {
     /// Ends the clean-up that was asked for.
     void completeCleanup() { std::exchange(cleanup, nullptr)(); }
 
-    bool recording = false;
+    std::atomic<bool> recording{false};
     bool broadcasting = false;
     bool systemRecording = false;
     bool paused = false;
