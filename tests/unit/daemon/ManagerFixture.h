@@ -21,8 +21,10 @@ class ManagerFixture : public testing::Test {
     static constexpr const char* kStore = "/private/var/mobile/Library/KelvoKit/";
     static constexpr const char* kPurgeService = "com.quillon.kelvod-cache-delete";
 
-    /// What a session was never asked to complete may hold the session itself.
+    /// What a session was never asked to complete may hold the session itself. A start that is still on its
+    /// way is let through first.
     ~ManagerFixture() override {
+        device.settle();
         for (const auto& made : sessions_) {
             made->start = nullptr;
             made->finish = nullptr;
