@@ -51,7 +51,7 @@ class Running {
 
 /// One token says who may run: nobody (`busy_` is false), the queue's thread, or one `sync` caller. Whoever
 /// holds it passes it on to the oldest item when its own work is done.
-class SerialQueue::State {
+class SerialQueue::State : public SpareTime::TurnHolder {
   public:
     explicit State(std::string label) : label_(std::move(label)) {}
 
@@ -87,7 +87,7 @@ class SerialQueue::State {
         turnRunsOn_ = runsOn;
         return true;
     }
-    void runInTurn(const Task& task) {
+    void runInTurn(const Task& task) override {
         const Running running(this);
         task();
         std::unique_lock lock(mutex_);
@@ -219,7 +219,7 @@ void SerialQueue::async(Task task) {
 void SerialQueue::asyncOrSoon(Task task) {
     if (!SpareTime::isThere() || !state_->tryTakeTurn(std::this_thread::get_id()))
         return async(std::move(task));
-    SpareTime::spend([state = state_, task = std::move(task)] { state->runInTurn(task); });
+    SpareTime::spend(state_, std::move(task));
 }
 void SerialQueue::sync(const Task& task) {
     const std::shared_ptr<State> state = state_;  // the task may let the last reference to this queue go

@@ -13,16 +13,16 @@ SpareTime::SpareTime() : outer_(std::exchange(spareTimeOfThread, this)) {}
 
 SpareTime::~SpareTime() {
     spareTimeOfThread = outer_;
-    for (Task& task : tasks_)
-        std::exchange(task, nullptr)();
+    if (queue_) queue_->runInTurn(task_);
 }
 
 bool SpareTime::isThere() {
-    return spareTimeOfThread != nullptr;
+    return spareTimeOfThread != nullptr && !spareTimeOfThread->queue_;
 }
 
-void SpareTime::spend(Task task) {
-    spareTimeOfThread->tasks_.push_back(std::move(task));
+void SpareTime::spend(std::shared_ptr<TurnHolder> queue, Task task) {
+    spareTimeOfThread->queue_ = std::move(queue);
+    spareTimeOfThread->task_ = std::move(task);
 }
 
 }  // namespace kelvo

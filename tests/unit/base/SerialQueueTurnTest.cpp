@@ -141,15 +141,38 @@ TEST(SerialQueueTurnTest, QueueThatGoesElsewhereWaitsForTheTaskThatIsToRun) {
     other.join();
 }
 
-TEST(SerialQueueTurnTest, SpentTimeHasNoSpareTimeOfItsOwn) {
+TEST(SerialQueueTurnTest, SpareTimeIsSpentOnce) {
+    SerialQueue queue("test.turn");
+    SerialQueue other("test.other");
+    std::thread::id otherRanOn;
     bool wasThere = true;
     {
         const SpareTime spare;
-        SpareTime::spend([&] { wasThere = SpareTime::isThere(); });
         EXPECT_TRUE(SpareTime::isThere());
+        queue.asyncOrSoon([&] { wasThere = SpareTime::isThere(); });
+        EXPECT_FALSE(SpareTime::isThere());
+        other.asyncOrSoon([&] { otherRanOn = std::this_thread::get_id(); });
     }
-    EXPECT_FALSE(wasThere);
+    other.sync([] {});
+    EXPECT_FALSE(wasThere) << "nor is there any while it is spent";
     EXPECT_FALSE(SpareTime::isThere());
+    EXPECT_NE(otherRanOn, std::this_thread::get_id());
+}
+
+TEST(SerialQueueTurnTest, ScopeWithinAScopeHasTimeOfItsOwn) {
+    SerialQueue queue("test.turn");
+    SerialQueue other("test.other");
+    std::vector<int> order;
+    {
+        const SpareTime outer;
+        queue.asyncOrSoon([&] { order.push_back(2); });
+        {
+            const SpareTime inner;
+            other.asyncOrSoon([&] { order.push_back(1); });
+        }
+        EXPECT_EQ(order, (std::vector<int>{1}));
+    }
+    EXPECT_EQ(order, (std::vector<int>{1, 2}));
 }
 
 }  // namespace
