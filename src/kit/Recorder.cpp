@@ -75,37 +75,37 @@ std::uint64_t Recorder::droppedAudioBuffers() const {
 }
 
 void Recorder::onState(std::function<void(const RecorderState&)> handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.state.swap(handler); });
+    core_->setHandler(&RecorderHandlers::state, std::move(handler));
 }
 void Recorder::onStop(MovieHandler handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.stop.swap(handler); });
+    core_->setHandler(&RecorderHandlers::stop, std::move(handler));
 }
 void Recorder::onLock(std::function<void(const Error&)> handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.lock.swap(handler); });
+    core_->setHandler(&RecorderHandlers::lock, std::move(handler));
 }
 void Recorder::onShouldResume(std::function<void()> handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.shouldResume.swap(handler); });
+    core_->setHandler(&RecorderHandlers::shouldResume, std::move(handler));
 }
 void Recorder::onTimer(std::function<void(const std::string&)> handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.timer.swap(handler); });
+    core_->setHandler(&RecorderHandlers::timer, std::move(handler));
 }
 void Recorder::onFrame(std::function<void(const Frame&)> handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.frame.swap(handler); });
+    core_->setHandler(&RecorderHandlers::frame, std::move(handler));
 }
 void Recorder::onAudio(std::function<void(const AudioBuffer&)> handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.audio.swap(handler); });
+    core_->setHandler(&RecorderHandlers::audio, std::move(handler));
 }
 void Recorder::onBroadcastInfo(std::function<void(const Dictionary&)> handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.broadcastInfo.swap(handler); });
+    core_->setHandler(&RecorderHandlers::broadcastInfo, std::move(handler));
 }
 void Recorder::onBroadcastURL(std::function<void(const std::string&)> handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.broadcastURL.swap(handler); });
+    core_->setHandler(&RecorderHandlers::broadcastURL, std::move(handler));
 }
 void Recorder::onConnectionLost(std::function<void(const Error&)> handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.connectionLost.swap(handler); });
+    core_->setHandler(&RecorderHandlers::connectionLost, std::move(handler));
 }
 void Recorder::onConnectionRestored(std::function<void()> handler) {
-    core_->handlers.with([&](RecorderHandlers& all) { all.connectionRestored.swap(handler); });
+    core_->setHandler(&RecorderHandlers::connectionRestored, std::move(handler));
 }
 
 }  // namespace kelvokit

@@ -14,7 +14,7 @@ using kelvo::KVRemoteDaemon;
 void Recorder::Core::shutDown() {
     const std::lock_guard lock(running_);
     isShutDown_ = true;
-    handlers.set({});
+    handlers_.set({});
     if (const IPCConnectionRef connection = connection_.exchange(nullptr)) connection->invalidate();
 }
 
@@ -100,10 +100,10 @@ void Recorder::Core::lookAgain(std::chrono::milliseconds pause) {
 }
 
 template <typename Handler, typename... Arguments>
-void Recorder::Core::notify(Handler RecorderHandlers::*handler, Arguments... arguments) {
-    post([this, handler, ... arguments = std::move(arguments)] {
-        const Handler present = handlers.with([&](const RecorderHandlers& all) { return all.*handler; });
-        if (present) present(arguments...);
+void Recorder::Core::notify(HeldHandler<Handler> RecorderHandlers::*place, Arguments... arguments) {
+    post([this, place, ... arguments = std::move(arguments)] {
+        const auto present = handlers_.with([&](const RecorderHandlers& all) { return all.*place; });
+        if (present) (*present)(arguments...);
     });
 }
 
@@ -180,8 +180,8 @@ void Recorder::Core::captureHandlerWithAudioSample(
     const AudioBuffer buffer(std::make_shared<const AudioBuffer::Content>(std::move(content)));
     post([this, buffer] {
         --waitingAudioBuffers_;
-        const auto present = handlers.with([](const RecorderHandlers& all) { return all.audio; });
-        if (present) present(buffer);
+        const auto present = handlers_.with([](const RecorderHandlers& all) { return all.audio; });
+        if (present) (*present)(buffer);
     });
 }
 

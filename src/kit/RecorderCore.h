@@ -13,6 +13,7 @@
 #include <kelvokit/Recorder.h>
 #include <memory>
 #include <mutex>
+#include <type_traits>
 
 namespace kelvokit {
 
@@ -33,19 +34,22 @@ inline constexpr std::chrono::milliseconds kLongestPause{5000};
 /// Sound that waits for the executor: about three seconds.
 inline constexpr int kMostWaitingAudioBuffers = 256;
 
-/// The handlers that a program has set.
+/// A handler that a program has set, or none. Held by whoever calls it, as it may be replaced meanwhile.
+template <typename Handler>
+using HeldHandler = std::shared_ptr<const Handler>;
+
 struct RecorderHandlers {
-    std::function<void(const RecorderState&)> state;
-    Recorder::MovieHandler stop;
-    std::function<void(const Error&)> lock;
-    std::function<void()> shouldResume;
-    std::function<void(const std::string&)> timer;
-    std::function<void(const Frame&)> frame;
-    std::function<void(const AudioBuffer&)> audio;
-    std::function<void(const Dictionary&)> broadcastInfo;
-    std::function<void(const std::string&)> broadcastURL;
-    std::function<void(const Error&)> connectionLost;
-    std::function<void()> connectionRestored;
+    HeldHandler<std::function<void(const RecorderState&)>> state;
+    HeldHandler<Recorder::MovieHandler> stop;
+    HeldHandler<std::function<void(const Error&)>> lock;
+    HeldHandler<std::function<void()>> shouldResume;
+    HeldHandler<std::function<void(const std::string&)>> timer;
+    HeldHandler<std::function<void(const Frame&)>> frame;
+    HeldHandler<std::function<void(const AudioBuffer&)>> audio;
+    HeldHandler<std::function<void(const Dictionary&)>> broadcastInfo;
+    HeldHandler<std::function<void(const std::string&)>> broadcastURL;
+    HeldHandler<std::function<void(const Error&)>> connectionLost;
+    HeldHandler<std::function<void()>> connectionRestored;
 };
 
 /// What outlives a recorder for as long as the library's threads use it: the connection, the state and the
@@ -74,7 +78,12 @@ class Recorder::Core : public kelvo::KVClientProtocol, public std::enable_shared
     RecorderState state() const { return state_.copy(); }
     std::uint64_t droppedAudioBuffers() const { return droppedAudioBuffers_; }
 
-    kelvo::Guarded<RecorderHandlers> handlers;
+    /// An empty handler removes.
+    template <typename Handler>
+    void setHandler(HeldHandler<Handler> RecorderHandlers::*place, std::type_identity_t<Handler> handler) {
+        auto held = handler ? std::make_shared<const Handler>(std::move(handler)) : nullptr;
+        handlers_.with([&](RecorderHandlers& all) { (all.*place).swap(held); });
+    }
 
     void updateScreenRecordingState() override;
     void updateBroadcastServiceInfo(const kelvo::Dictionary& serviceInfo) override;
@@ -109,12 +118,13 @@ class Recorder::Core : public kelvo::KVClientProtocol, public std::enable_shared
     void post(Work work);
     /// Calls one of the handlers, as it is then, on the executor.
     template <typename Handler, typename... Arguments>
-    void notify(Handler RecorderHandlers::*handler, Arguments... arguments);
+    void notify(HeldHandler<Handler> RecorderHandlers::*place, Arguments... arguments);
     void changeState(const std::function<void(RecorderState&)>& change);
     void ended();
     Error localError(ErrorCode code, std::string detail) const;
 
     const RecorderEnvironment environment_;
+    kelvo::Guarded<RecorderHandlers> handlers_;
     std::mutex connecting_;  ///< so that two requests at once make one connection
     kelvo::Guarded<kelvo::IPCConnectionRef> connection_;
     kelvo::Guarded<RecorderState> state_;

@@ -43,6 +43,35 @@ TEST_F(RecorderSamplesTest, FrameThatNobodyWantsGoesBackAtOnce) {
     EXPECT_TRUE(watched.expired());
 }
 
+TEST_F(RecorderSamplesTest, HandlerKeepsWhatItHoldsFromCallToCall) {
+    startRecording();
+    int latest = 0;
+    recorder->onFrame([&latest, count = 0](const Frame&) mutable { latest = ++count; });
+    asDaemon([](auto& client) {
+        const auto object = std::make_shared<kelvo::KVIOSurfaceObject>();
+        object->setIOSurface(*kelvo::VideoSurface::create(kelvo::VideoSurface::Geometry::packed(4, 2)));
+        client.captureHandlerWithSample(object, {});
+        client.captureHandlerWithSample(object, {});
+    });
+    EXPECT_EQ(latest, 2);
+}
+
+TEST_F(RecorderSamplesTest, HandlerMayReplaceItself) {
+    startRecording();
+    std::string calls;
+    recorder->onFrame([&, name = std::string("first")](const Frame&) {
+        recorder->onFrame([&](const Frame&) { calls += " second"; });
+        calls += name;
+    });
+    asDaemon([](auto& client) {
+        const auto object = std::make_shared<kelvo::KVIOSurfaceObject>();
+        object->setIOSurface(*kelvo::VideoSurface::create(kelvo::VideoSurface::Geometry::packed(4, 2)));
+        client.captureHandlerWithSample(object, {});
+        client.captureHandlerWithSample(object, {});
+    });
+    EXPECT_EQ(calls, "first second");
+}
+
 TEST_F(RecorderSamplesTest, SoundArrivesWithItsFormat) {
     startRecording();
     std::optional<AudioBuffer> heard;
