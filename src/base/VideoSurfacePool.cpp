@@ -28,9 +28,11 @@ Result<VideoSurfaceRef> VideoSurfacePool::take() {
 
 VideoSurfaceRef VideoSurfacePool::lend(VideoSurfaceRef surface) const {
     VideoSurface* const lent = surface.get();
-    return VideoSurfaceRef(lent, [free = std::weak_ptr<Free>(free_), surface](VideoSurface*) {
-        if (const auto home = free.lock()) home->with([&](auto& all) { all.push_back(surface); });
-    });
+    return VideoSurfaceRef(
+        lent, [free = std::weak_ptr<Free>(free_), surface = std::move(surface)](VideoSurface*) mutable {
+            if (const auto home = free.lock())
+                home->with([&](auto& all) { all.push_back(std::move(surface)); });
+        });
 }
 
 }  // namespace kelvo
