@@ -3,6 +3,7 @@
 // second. Beside it, with the same rhythm, the least that two processes can do: one small datagram there and
 // one back.
 #include "ProcessorTime.h"
+#include "base/KVLog.h"
 #include "base/VideoSurfacePool.h"
 #include "ipc/KVClientProtocolTable.h"
 #include "ipc/KVClientProxy.h"
@@ -237,6 +238,7 @@ double median(const std::vector<Turn>& turns, const Measure& measure) {
 }  // namespace
 
 int main() {
+    setLogsSamples(false);  // as the user's service is started
     std::vector<Turn> bare;
     std::vector<Turn> ours;
     for (int turn = 0; turn < kTurns; ++turn) {
