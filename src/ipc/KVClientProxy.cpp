@@ -64,8 +64,11 @@ void KVClientProxy::updateBroadcastURL(const URL& broadcastURL) {
 void KVClientProxy::captureHandlerWithSample(const std::shared_ptr<KVIOSurfaceObject>& surface,
                                              const RecordBytes<TimingRecord>& timingData) {
     KVLogSample("KVClientProxy:captureHandlerWithSample:");
-    deliverTo(connection(), "KVClientProxy:captureHandlerWithSample: error getting remote proxy",
-              [&](auto& client) { client.captureHandlerWithSample(surface, timingData); });
+    const IPCConnectionRef client = connection();
+    constexpr std::size_t kMethod = messageIndex<&KVClientProtocol::captureHandlerWithSample>();
+    if (client && surface && client->handOver({kMethod, surface->ioSurface(), timingData})) return;
+    deliverTo(client, "KVClientProxy:captureHandlerWithSample: error getting remote proxy",
+              [&](auto& remote) { remote.captureHandlerWithSample(surface, timingData); });
 }
 
 void KVClientProxy::captureHandlerWithAudioSample(std::span<const std::byte> audioData,

@@ -3,6 +3,7 @@
 #include "ipc/IPCCoding.h"
 #include "platform/IPC.h"
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <functional>
@@ -102,6 +103,17 @@ std::vector<IPCArgument> describe(TypeList<Types...>, const std::array<Named, Co
     return described;
 }
 
+/// Whether arguments are those of a frame: a surface, and the bytes of a record about it.
+template <typename Arguments>
+struct FrameTraits {
+    static constexpr bool kIsFrame = false;
+};
+template <std::size_t Size>
+struct FrameTraits<TypeList<std::shared_ptr<KVIOSurfaceObject>, std::array<std::byte, Size>>> {
+    static constexpr bool kIsFrame = true;
+    using Record = std::array<std::byte, Size>;
+};
+
 /// Calls `use` with the values as their C++ types. False when their number or one of them is wrong.
 template <typename... Types, typename Use, std::size_t... Places>
 bool withDecoded(TypeList<Types...>, const Array& values, const Use& use, std::index_sequence<Places...>) {
@@ -170,6 +182,22 @@ struct Message {
             }
         });
     }
+
+    /// The same for a frame. False also when the member function takes none.
+    static bool callWithFrame([[maybe_unused]] Protocol& target, [[maybe_unused]] const IPCFrame& frame) {
+        using Frame = detail::FrameTraits<typename Traits::Arguments>;
+        if constexpr (Frame::kIsFrame && !Traits::kHasHandler) {
+            typename Frame::Record record;
+            if (frame.record.size() != record.size()) return false;
+            std::ranges::copy(frame.record, record.begin());
+            const auto object = std::make_shared<KVIOSurfaceObject>();
+            object->setIOSurface(frame.surface);
+            (target.*Member)(object, record);
+            return true;
+        } else {
+            return false;
+        }
+    }
 };
 
 /// The interface of a protocol, made once.
@@ -213,16 +241,24 @@ class ProtocolDispatcher : public IPCExportedObject {
     bool serve(std::size_t method, const Array& arguments, IPCReply reply) override {
         const auto target = target_.lock();
         if (!target) return true;
-        return callers()[method](*target, arguments, std::move(reply));
+        return rows()[method].call(*target, arguments, std::move(reply));
+    }
+    bool serveFrame(const IPCFrame& frame) override {
+        const auto target = target_.lock();
+        return !target || rows()[frame.method].callWithFrame(*target, frame);
     }
 
   private:
-    using Caller = bool (*)(Protocol&, const Array&, IPCReply);
-    static const auto& callers() {
+    struct Row {
+        bool (*call)(Protocol&, const Array&, IPCReply);
+        bool (*callWithFrame)(Protocol&, const IPCFrame&);
+    };
+    static const auto& rows() {
         static constexpr auto table = std::apply(
             [](const auto&... messages) {
-                return std::array<Caller, sizeof...(messages)>{
-                    &std::remove_cvref_t<decltype(messages)>::call...};
+                return std::array<Row, sizeof...(messages)>{
+                    Row{&std::remove_cvref_t<decltype(messages)>::call,
+                        &std::remove_cvref_t<decltype(messages)>::callWithFrame}...};
             },
             ProtocolTable<Protocol>::kMessages);
         return table;

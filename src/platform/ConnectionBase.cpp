@@ -9,13 +9,14 @@
 namespace kelvo {
 namespace {
 
-thread_local IPCConnectionRef connectionServed;
+/// Whoever serves it holds it.
+thread_local ConnectionBase* connectionServed = nullptr;
 
 /// Names the connection that is served for as long as this object lives.
 class Serving {
   public:
-    explicit Serving(IPCConnectionRef connection) { connectionServed = std::move(connection); }
-    ~Serving() { connectionServed.reset(); }
+    explicit Serving(ConnectionBase& connection) { connectionServed = &connection; }
+    ~Serving() { connectionServed = nullptr; }
     Serving(const Serving&) = delete;
     Serving& operator=(const Serving&) = delete;
 };
@@ -62,12 +63,12 @@ class ConnectionBase::Remote : public IPCRemoteObject {
 };
 
 IPCConnectionRef ConnectionBase::current() {
-    return connectionServed;
+    return connectionServed != nullptr ? connectionServed->shared_from_this() : nullptr;
 }
 
 void ConnectionBase::setExported(std::shared_ptr<const IPCInterface> interface,
                                  std::shared_ptr<IPCExportedObject> object) {
-    exported_.set({std::move(interface), std::move(object)});
+    exported_.set(std::make_shared<const Exported>(Exported{std::move(interface), std::move(object)}));
 }
 
 void ConnectionBase::setRemoteInterface(std::shared_ptr<const IPCInterface> interface) {
@@ -75,7 +76,7 @@ void ConnectionBase::setRemoteInterface(std::shared_ptr<const IPCInterface> inte
 }
 
 std::shared_ptr<const IPCInterface> ConnectionBase::exportedInterface() const {
-    return exported_.with([](const Exported& exported) { return exported.interface; });
+    return exported_.with([](const auto& exported) { return exported ? exported->interface : nullptr; });
 }
 
 void ConnectionBase::setInterruptionHandler(std::function<void()> handler) {
@@ -129,19 +130,49 @@ void ConnectionBase::enqueue(Task task) {
     });
 }
 
-void ConnectionBase::received(std::size_t method, Array arguments, IPCReply reply, WaitingCost cost) {
-    if (reply && *owedReplies_ >= ipc_bounds::kMostOwedReplies)
-        return cutOff("more requests than may be outstanding");
+/// What a lost peer sent before it went still counts; after an invalidation nothing is served.
+template <typename Serve>
+void ConnectionBase::serveWith(const Serve& serve) {
+    if (state_ == State::over) return;
+    const auto exported = exported_.copy();
+    if (!exported || !exported->object) return;
+    const Serving serving(*this);
+    serve(*exported);
+}
+
+/// Runs with the connection held.
+template <typename Work>
+void ConnectionBase::enqueueServed(WaitingCost cost, Work work) {
     waitingMessages_ += cost.messages;
     waitingBytes_ += cost.bytes;
     waitingDescriptors_ += cost.descriptors;
-    enqueue([self = shared_from_this(), method, arguments = std::move(arguments),
-             reply = owed(std::move(reply)), cost]() mutable {
-        self->serve(method, std::exchange(arguments, {}), std::exchange(reply, nullptr));
+    enqueue([self = shared_from_this(), work = std::move(work), cost]() mutable {
+        work();
         self->waitingMessages_ -= cost.messages;
         self->waitingBytes_ -= cost.bytes;
         self->waitingDescriptors_ -= cost.descriptors;
         self->didServe();
+    });
+}
+
+void ConnectionBase::received(std::size_t method, Array arguments, IPCReply reply, WaitingCost cost) {
+    if (reply && *owedReplies_ >= ipc_bounds::kMostOwedReplies)
+        return cutOff("more requests than may be outstanding");
+    enqueueServed(cost, [this, method, arguments = std::move(arguments),
+                         reply = owed(std::move(reply))]() mutable {
+        serveWith([&](const Exported& exported) {
+            if (exported.object->serve(method, std::exchange(arguments, {}), std::exchange(reply, nullptr)))
+                return;
+            cutOff("arguments of " + exported.interface->methods[method].name + " are not what it takes");
+        });
+    });
+}
+
+void ConnectionBase::received(const IPCFrame& frame) {
+    enqueueServed({1, 0, 0}, [this, method = frame.method, surface = frame.surface,
+                              record = Bytes(frame.record.begin(), frame.record.end())]() mutable {
+        const VideoSurfaceRef held = std::exchange(surface, nullptr);
+        serve({method, held, record});
     });
 }
 
@@ -152,14 +183,11 @@ IPCReply ConnectionBase::owed(IPCReply reply) const {
     };
 }
 
-/// What a lost peer sent before it went still counts; after an invalidation nothing is served.
-void ConnectionBase::serve(std::size_t method, const Array& arguments, const IPCReply& reply) {
-    if (state_ == State::over) return;
-    const Exported exported = exported_.copy();
-    if (!exported.object) return;
-    const Serving serving(shared_from_this());
-    if (exported.object->serve(method, arguments, reply)) return;
-    cutOff("arguments of " + exported.interface->methods[method].name + " are not what it takes");
+void ConnectionBase::serve(const IPCFrame& frame) {
+    serveWith([&](const Exported& exported) {
+        const bool isMethod = frame.method < exported.interface->methods.size();
+        if (!isMethod || !exported.object->serveFrame(frame)) cutOff("frame that is none");
+    });
 }
 
 void ConnectionBase::receivedReply(ReplyIdentifier identifier, Array values) {
@@ -237,7 +265,7 @@ void ConnectionBase::runHandlers(State state) {
     if (state == State::lost && handlers.interruption) handlers.interruption();
     state_ = State::over;
     if (handlers.invalidation) handlers.invalidation();
-    exported_.set({});
+    exported_.set(nullptr);
     for (const auto& [identifier, awaited] : awaitedReplies_.exchange({})) {
         if (awaited.errorHandler) awaited.errorHandler(connectionOver());
     }

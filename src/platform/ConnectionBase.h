@@ -26,6 +26,8 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     void setInvalidationHandler(std::function<void()> handler) override;
     void resume() override;
     void invalidate() override { end(State::over); }
+    /// A transport has a shorter way for frames or it has not.
+    bool handOver(const IPCFrame&) override { return false; }
     std::shared_ptr<IPCRemoteObject> remoteObjectProxyWithErrorHandler(
         std::function<void(const KVError&)> errorHandler) override;
 
@@ -55,8 +57,10 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     /// but that it may be called more than once and after the end: that is seen to here. A peer that waits
     /// for too many replies is cut off instead.
     void received(std::size_t method, Array arguments, IPCReply reply, WaitingCost cost = {1, 0, 0});
-    /// Serves such a message then and there. Only in a turn of the connection's queue.
-    void serve(std::size_t method, const Array& arguments, const IPCReply& reply);
+    /// The same for a frame.
+    void received(const IPCFrame& frame);
+    /// Serves such a frame then and there. Only in a turn of the connection's queue.
+    void serve(const IPCFrame& frame);
     /// The reply arrived to what was sent with this identifier; an unknown one is ignored.
     void receivedReply(ReplyIdentifier identifier, Array values);
     /// The peer could not serve it.
@@ -110,6 +114,10 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
         std::vector<Task> held;
     };
 
+    template <typename Serve>
+    void serveWith(const Serve& serve);
+    template <typename Work>
+    void enqueueServed(WaitingCost cost, Work work);
     void send(std::size_t method, const Array& arguments, IPCReply replyHandler,
               const ErrorReport& errorHandler);
     OptionalError trySend(std::size_t method, const Array& arguments, AwaitedReply awaited);
@@ -127,7 +135,7 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     const std::shared_ptr<std::atomic<std::size_t>> owedReplies_ =
         std::make_shared<std::atomic<std::size_t>>(0);
     std::atomic<ReplyIdentifier> lastIdentifier_{0};
-    Guarded<Exported> exported_;
+    Guarded<std::shared_ptr<const Exported>> exported_;
     Guarded<std::shared_ptr<const IPCInterface>> remoteInterface_;
     Guarded<Handlers> handlers_;
     Guarded<std::map<ReplyIdentifier, AwaitedReply>> awaitedReplies_;

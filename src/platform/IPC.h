@@ -69,6 +69,12 @@ class IPCConnection {
     virtual void setInterruptionHandler(std::function<void()> handler) = 0;
     virtual void setInvalidationHandler(std::function<void()> handler) = 0;
 
+    /// Hands a frame to the peer at a fraction of what a message costs, if the transport can do that by now:
+    /// in order with the messages, and with its surface lent as theirs are. False when nothing was done; then
+    /// it is to be sent as a message. `frame.method` is one of the remote interface's. Never waits for the
+    /// peer.
+    virtual bool handOver(const IPCFrame& frame) = 0;
+
     /// Starts receiving.
     virtual void resume() = 0;
     /// Ends the connection; what was sent before still goes out as far as the peer takes it at once.

@@ -1,11 +1,13 @@
 #pragma once
 
 #include "base/Value.h"
+#include "base/VideoSurface.h"
 
 #include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -53,6 +55,14 @@ struct IPCInterface {
     }
 };
 
+/// The call of a one-way method that takes a surface and the bytes of a record about it, and nothing else. As
+/// there are many of them, they may travel without becoming values. Only refers to what its maker has.
+struct IPCFrame {
+    std::size_t method;  ///< its place in the interface
+    const VideoSurfaceRef& surface;
+    std::span<const std::byte> record;
+};
+
 /// Sends the values of a reply. Once, from any thread; later calls do nothing. Dropped without a call, the
 /// sender waits until its connection ends.
 using IPCReply = std::function<void(Array values)>;
@@ -66,6 +76,11 @@ class IPCExportedObject {
     /// when the message is one-way or its sender wants no reply. False when the arguments are not what the
     /// method takes: then nothing was done and the transport ends the connection.
     virtual bool serve(std::size_t method, const Array& arguments, IPCReply reply) = 0;
+    /// The same for a frame. False also when its method, or the whole object, takes none.
+    virtual bool serveFrame(const IPCFrame& frame) {
+        static_cast<void>(frame);
+        return false;
+    }
 };
 
 }  // namespace kelvo

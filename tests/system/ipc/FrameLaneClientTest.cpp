@@ -234,8 +234,9 @@ TEST_P(LyingLaneTest, EndsTheConnection) {
     EXPECT_THAT(log.texts(), testing::Contains(testing::HasSubstr("frame that is none")));
 }
 
-const std::array<Spoiler, 3> kSpoilers{
+const std::array<Spoiler, 4> kSpoilers{
     [](FrameLane::Entry& entry) { entry.size = FrameLane::kMostBytes + 1; },
+    [](FrameLane::Entry& entry) { entry.size = 71; },
     [](FrameLane::Entry& entry) { entry.method = 1000; },
     [](FrameLane::Entry& entry) {
         entry.method =
@@ -243,7 +244,7 @@ const std::array<Spoiler, 3> kSpoilers{
     },
 };
 std::string spoilerName(const testing::TestParamInfo<Spoiler>& info) {
-    return std::array<const char*, 3>{"TooManyBytes", "NoMethod", "AnotherMethod"}[info.index];
+    return std::array<const char*, 4>{"TooManyBytes", "TooFewBytes", "NoMethod", "AnotherMethod"}[info.index];
 }
 INSTANTIATE_TEST_SUITE_P(All, LyingLaneTest, testing::ValuesIn(kSpoilers), spoilerName);
 

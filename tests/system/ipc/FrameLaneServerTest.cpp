@@ -1,5 +1,6 @@
 #include "base/VideoSurfacePool.h"
 #include "ipc/KVClientProtocolTable.h"
+#include "ipc/KVClientProxy.h"
 #include "platform/IPCBounds.h"
 #include "platform/linux/ipc/Introspection.h"
 #include "platform/linux/ipc/SocketConnection.h"
@@ -10,6 +11,7 @@
 #include <algorithm>
 #include <atomic>
 #include <cerrno>
+#include <string>
 #include <sys/mman.h>
 
 #include <gtest/gtest.h>
@@ -33,12 +35,10 @@ class FrameLaneServerTest : public testing::Test {
         server->resume();
         client->authenticate();
         client->readUntil("AGREE_UNIX_FD\r\n");
-        remote = std::make_unique<RemoteClient>(
-            *server, [this](const KVError& error) { failures.push_back(error.code()); });
+        proxy = std::make_unique<KVClientProxy>(server);
     }
     ~FrameLaneServerTest() override {
-        remote.reset();
-        server->invalidate();
+        proxy.reset();
         loop->stop();
     }
 
@@ -61,7 +61,11 @@ class FrameLaneServerTest : public testing::Test {
         object->setIOSurface(std::move(picture));
         RecordBytes<TimingRecord> timing{};
         timing[0] = static_cast<std::byte>(++sent);
-        remote->captureHandlerWithSample(object, timing);
+        proxy->captureHandlerWithSample(object, timing);
+    }
+    std::size_t failures(int code) const {
+        return log.count("KVClientProxy:captureHandlerWithSample: error getting remote proxy: " +
+                         std::to_string(code));
     }
     /// The serial of the frame that came as a message.
     std::uint32_t readFrame() {
@@ -104,8 +108,7 @@ class FrameLaneServerTest : public testing::Test {
     VideoSurfacePool pool{VideoSurface::Geometry::packed(8, 8), 1};
     std::unique_ptr<RawSocket> client;
     std::shared_ptr<SocketConnection> server;
-    std::unique_ptr<RemoteClient> remote;
-    std::vector<std::int64_t> failures;
+    std::unique_ptr<KVClientProxy> proxy;
     std::optional<FrameLane> lane;
     std::uint32_t lastSerial = 0;
     std::uint32_t firstSerial = 0;
@@ -140,9 +143,9 @@ TEST_F(FrameLaneServerTest, FrameGoesByTheLaneWhenTheClientHasItsSurface) {
 TEST_F(FrameLaneServerTest, OtherMessagesStayOnTheSocketAndAreCountedWithTheFrames) {
     becomeReady();
     send(surface);
-    remote->recordingDidPause();
+    proxy->recordingDidPause();
     EXPECT_EQ(client->read().parsed().serial, lane->entry(0).serial + 1);
-    remote->captureHandlerWithSample(std::make_shared<KVIOSurfaceObject>(), {});
+    proxy->captureHandlerWithSample(std::make_shared<KVIOSurfaceObject>(), {});
     EXPECT_EQ(client->read().parsed().member, "captureHandlerWithSample") << "a frame without a surface";
     send(surface);
     EXPECT_EQ(lane->entry(1).serial, lane->entry(0).serial + 3);
@@ -198,13 +201,13 @@ TEST_F(FrameLaneServerTest, FramesOfBothWaysCountAsLent) {
     becomeReady();
     for (std::size_t i = 1; i < ipc_bounds::kMostLentMessages; ++i)
         send(surface);
-    EXPECT_EQ(failures, std::vector<std::int64_t>());
+    EXPECT_EQ(failures(EAGAIN), 0U);
     send(surface);
-    EXPECT_EQ(failures, std::vector<std::int64_t>{EAGAIN});
+    EXPECT_EQ(failures(EAGAIN), 1U);
     lane->giveBack(0, lane->entry(0).serial);
     const std::uint32_t last = lane->entry(FrameLane::kPlaces - 2).serial;
     send(surface);
-    EXPECT_EQ(failures.size(), 1U);
+    EXPECT_EQ(failures(EAGAIN), 1U);
     EXPECT_EQ(lane->entry(FrameLane::kPlaces - 1).serial, last + 1) << "what was refused has no serial";
 }
 
@@ -215,7 +218,7 @@ TEST_F(FrameLaneServerTest, WhatIsLentComesBackWithTheEnd) {
     server->invalidate();
     EXPECT_EQ(surface.use_count(), 1);
     send(surface);
-    EXPECT_EQ(failures, std::vector<std::int64_t>{ENOTCONN});
+    EXPECT_EQ(failures(ENOTCONN), 1U);
 }
 
 /// Whatever a client writes into the page, the daemon goes on: at worst this client's frames come back early.

@@ -133,6 +133,39 @@ TEST_F(KVClientProxyTest, EveryArgumentArrivesAsItWasSent) {
     EXPECT_EQ(audio.bufferType, SampleBuffer::Type::applicationAudio);
 }
 
+/// A connection that hands over the frames of surfaces which are eight wide.
+class ConnectionWithAWayForFrames : public SimulatedConnection {
+  public:
+    ConnectionWithAWayForFrames() : SimulatedConnection(10, Dictionary()) {
+        setRemoteInterface(interfaceOf<KVClientProtocol>());
+    }
+    bool handOver(const IPCFrame& frame) override {
+        if (!frame.surface || frame.surface->width() != 8) return false;
+        methods.push_back(remoteInterface()->methods.at(frame.method).name);
+        records.emplace_back(frame.record.begin(), frame.record.end());
+        return true;
+    }
+    std::vector<std::string> methods;
+    std::vector<Bytes> records;
+};
+
+TEST_F(KVClientProxyTest, FrameThatIsHandedOverIsNotSent) {
+    const auto connection = std::make_shared<ConnectionWithAWayForFrames>();
+    KVClientProxy proxy(connection);
+    const auto object = std::make_shared<KVIOSurfaceObject>();
+    object->setIOSurface(*VideoSurface::create(VideoSurface::Geometry::packed(8, 2)));
+    const auto timing = bytesOfRecord(TimingRecord{{1, 30, 1, 0}, {5, 30, 1, 0}, {}});
+    proxy.captureHandlerWithSample(object, timing);
+    EXPECT_THAT(connection->methods, ElementsAre("captureHandlerWithSample"));
+    EXPECT_THAT(connection->records, ElementsAre(Bytes(timing.begin(), timing.end())));
+    EXPECT_EQ(log.count("KVClientProxy:captureHandlerWithSample:"), 1U);
+    EXPECT_THAT(linesAbout("error getting remote proxy"), IsEmpty());
+    object->setIOSurface(*VideoSurface::create(VideoSurface::Geometry::packed(4, 2)));
+    proxy.captureHandlerWithSample(object, timing);
+    EXPECT_EQ(connection->methods.size(), 1U);
+    EXPECT_THAT(linesAbout("error getting remote proxy"), testing::SizeIs(1)) << "sent, but it has no peer";
+}
+
 TEST_F(KVClientProxyTest, GoingAwayEndsTheConnectionWithoutItsHandlers) {
     const Client client = connect(10);
     { const KVClientProxy proxy(accepted.front()); }

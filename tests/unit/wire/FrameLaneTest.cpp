@@ -123,8 +123,8 @@ TEST(FrameLaneTest, FileCanNeitherGrowNorShrink) {
 
 class FrameLaneSenderTest : public testing::Test {
   protected:
-    bool takes(const VideoSurfaceRef& which, Moment now = kStart) const {
-        return sender.takes(*which, bytes, now);
+    bool put(const VideoSurfaceRef& which, Moment now = kStart, std::uint32_t serial = 1) {
+        return sender.put(serial, {6, which, bytes}, now);
     }
     std::size_t countGivenBack() {
         LentSurfaces gone;
@@ -140,31 +140,31 @@ class FrameLaneSenderTest : public testing::Test {
 };
 
 TEST_F(FrameLaneSenderTest, TakesOnlySurfacesThatTheClientHas) {
-    EXPECT_FALSE(takes(surface));
+    EXPECT_FALSE(put(surface));
+    EXPECT_FALSE(client.hasEntry(0));
     sender.sentInMessage(*surface, kStart);
-    EXPECT_TRUE(takes(surface));
-    EXPECT_FALSE(takes(surfaceOf(8)));
+    EXPECT_TRUE(put(surface));
+    EXPECT_FALSE(put(surfaceOf(8)));
     sender.forgetSurfaces();
-    EXPECT_FALSE(takes(surface));
+    EXPECT_FALSE(put(surface));
 }
 
 TEST_F(FrameLaneSenderTest, SurfaceThatWasNotSentForHalfASecondGoesInAMessage) {
     sender.sentInMessage(*surface, kStart);
-    EXPECT_TRUE(takes(surface, kStart + milliseconds(499)));
-    EXPECT_FALSE(takes(surface, kStart + milliseconds(500)));
-    sender.put(1, 0, surface, bytes, kStart + milliseconds(400));
-    EXPECT_TRUE(takes(surface, kStart + milliseconds(899)));
-    EXPECT_FALSE(takes(surface, kStart + milliseconds(900)));
+    EXPECT_FALSE(put(surface, kStart + milliseconds(500)));
+    EXPECT_TRUE(put(surface, kStart + milliseconds(499)));
+    EXPECT_FALSE(put(surface, kStart + milliseconds(999)));
+    EXPECT_TRUE(put(surface, kStart + milliseconds(998)));
 }
 
 TEST_F(FrameLaneSenderTest, SameFileAsAnotherSurfaceIsNotTheSame) {
     sender.sentInMessage(*surface, kStart);
     const auto half = *VideoSurface::fromDescriptor(UniqueFd(::dup(surface->descriptor())),
                                                     VideoSurface::Geometry::packed(4, 8));
-    EXPECT_FALSE(takes(half));
+    EXPECT_FALSE(put(half));
     sender.sentInMessage(*half, kStart);
-    EXPECT_TRUE(takes(half));
-    EXPECT_FALSE(takes(surface)) << "the client would take it for the one that was sent last";
+    EXPECT_TRUE(put(half));
+    EXPECT_FALSE(put(surface)) << "the client would take it for the one that was sent last";
 }
 
 TEST_F(FrameLaneSenderTest, ForgetsTheSurfaceThatTheClientForgets) {
@@ -173,40 +173,39 @@ TEST_F(FrameLaneSenderTest, ForgetsTheSurfaceThatTheClientForgets) {
         surfaces.push_back(surfaceOf(8));
         sender.sentInMessage(*surfaces.back(), kStart + milliseconds(i));
     }
-    sender.put(1, 0, surfaces[0], bytes, kStart + milliseconds(20));
+    EXPECT_TRUE(put(surfaces[0], kStart + milliseconds(20)));
     sender.sentInMessage(*surface, kStart + milliseconds(21));
-    EXPECT_TRUE(takes(surfaces[0]));
-    EXPECT_FALSE(takes(surfaces[1])) << "used longest ago";
-    EXPECT_TRUE(takes(surfaces[2]));
-    EXPECT_TRUE(takes(surface));
+    EXPECT_TRUE(put(surfaces[0]));
+    EXPECT_FALSE(put(surfaces[1])) << "used longest ago";
+    EXPECT_TRUE(put(surfaces[2]));
+    EXPECT_TRUE(put(surface));
 }
 
 TEST_F(FrameLaneSenderTest, BytesThatDoNotFitGoInAMessage) {
     sender.sentInMessage(*surface, kStart);
-    EXPECT_TRUE(sender.takes(*surface, Bytes(FrameLane::kMostBytes), kStart));
-    EXPECT_FALSE(sender.takes(*surface, Bytes(FrameLane::kMostBytes + 1), kStart));
+    EXPECT_FALSE(sender.put(1, {0, surface, Bytes(FrameLane::kMostBytes + 1)}, kStart));
+    EXPECT_EQ(sender.lentCount(), 0U);
+    EXPECT_TRUE(sender.put(1, {0, surface, Bytes(FrameLane::kMostBytes)}, kStart));
 }
 
 TEST_F(FrameLaneSenderTest, PlaceIsTakenAgainOnlyWhenItsFrameIsBack) {
     sender.sentInMessage(*surface, kStart);
-    for (std::uint32_t serial = 1; serial <= FrameLane::kPlaces; ++serial) {
-        ASSERT_TRUE(takes(surface));
-        sender.put(serial, 0, surface, bytes, kStart);
-    }
-    EXPECT_FALSE(takes(surface));
+    for (std::uint32_t serial = 1; serial <= FrameLane::kPlaces; ++serial)
+        ASSERT_TRUE(put(surface, kStart, serial));
+    EXPECT_FALSE(put(surface));
     EXPECT_EQ(sender.lentCount(), FrameLane::kPlaces);
     client.giveBack(1, 2);
     EXPECT_EQ(countGivenBack(), 1U);
-    EXPECT_FALSE(takes(surface)) << "the oldest is not back";
+    EXPECT_FALSE(put(surface)) << "the oldest is not back";
     client.giveBack(0, 1);
     EXPECT_EQ(countGivenBack(), 1U);
     EXPECT_EQ(sender.lentCount(), FrameLane::kPlaces - 2);
-    EXPECT_TRUE(takes(surface));
+    EXPECT_TRUE(put(surface));
 }
 
 TEST_F(FrameLaneSenderTest, FrameIsHeldUntilItIsGivenBack) {
     sender.sentInMessage(*surface, kStart);
-    sender.put(5, 2, surface, bytes, kStart);
+    ASSERT_TRUE(put(surface, kStart, 5));
     EXPECT_EQ(surface.use_count(), 2);
     client.giveBack(0, 4);
     EXPECT_EQ(countGivenBack(), 0U) << "another frame's serial";
@@ -218,7 +217,7 @@ TEST_F(FrameLaneSenderTest, FrameIsHeldUntilItIsGivenBack) {
 
 TEST_F(FrameLaneSenderTest, FrameMayBeGivenBackByAMessage) {
     sender.sentInMessage(*surface, kStart);
-    sender.put(5, 2, surface, bytes, kStart);
+    ASSERT_TRUE(put(surface, kStart, 5));
     LentSurfaces gone;
     sender.takeGivenBack(4, gone);
     EXPECT_EQ(gone.size(), 0U);
@@ -231,8 +230,7 @@ TEST_F(FrameLaneSenderTest, ReceiverHasTheFramesInTheirOrder) {
     FrameLaneReceiver receiver(client, [] {});
     sender.sentInMessage(*surface, kStart);
     for (std::uint32_t serial = 1; serial <= 40; ++serial) {
-        ASSERT_TRUE(takes(surface));
-        sender.put(serial, 6, surface, bytes, kStart);
+        ASSERT_TRUE(put(surface, kStart, serial));
         ASSERT_TRUE(receiver.hasFront());
         EXPECT_EQ(receiver.front().serial, serial);
         EXPECT_EQ(receiver.front().method, 6U);

@@ -54,6 +54,11 @@ struct Message {
     bool wantsReply() const { return type == MessageType::call && (flags & kNoReplyExpected) == 0; }
 };
 
+/// The serial of the next message; 0 is none.
+inline std::uint32_t serialAfter(std::uint32_t serial) {
+    return serial + 1 == 0 ? 1 : serial + 1;
+}
+
 /// Bytes that a message's size can be read from.
 inline constexpr std::size_t kFixedHeader = 16;
 

@@ -5,11 +5,6 @@
 
 namespace kelvo {
 
-const FrameLaneSender::Known* FrameLaneSender::find(const VideoSurface& surface) const {
-    const auto found = std::ranges::find(known_, surface.file(), &Known::file);
-    return found == known_.end() ? nullptr : &*found;
-}
-
 /// Forgets in the order in which the client does.
 void FrameLaneSender::sentInMessage(const VideoSurface& surface, Moment now) {
     std::erase_if(known_, [&](const Known& each) { return each.file == surface.file(); });
@@ -18,42 +13,46 @@ void FrameLaneSender::sentInMessage(const VideoSurface& surface, Moment now) {
     known_.push_back({surface.file(), surface.geometry(), now});
 }
 
-bool FrameLaneSender::takes(const VideoSurface& surface, std::span<const std::byte> bytes, Moment now) const {
-    if (bytes.size() > FrameLane::kMostBytes || loans_[count_ % FrameLane::kPlaces].surface) return false;
-    const Known* known = find(surface);
-    return known != nullptr && known->geometry == surface.geometry() && now - known->lastSent < kPatience;
-}
-
-void FrameLaneSender::put(std::uint32_t serial, std::size_t method, std::shared_ptr<VideoSurface> surface,
-                          std::span<const std::byte> bytes, Moment now) {
+bool FrameLaneSender::put(std::uint32_t serial, const IPCFrame& frame, Moment now) {
+    const std::size_t place = count_ % FrameLane::kPlaces;
+    if (frame.record.size() > FrameLane::kMostBytes || loans_[place].surface) return false;
+    const VideoSurface& surface = *frame.surface;
+    const auto known = std::ranges::find(known_, surface.file(), &Known::file);
+    if (known == known_.end() || known->geometry != surface.geometry() || now - known->lastSent >= kPatience)
+        return false;
+    known->lastSent = now;
+    loans_[place] = {serial, frame.surface};
+    ++lentCount_;
     FrameLane::Entry entry;
     entry.serial = serial;
-    entry.method = static_cast<std::uint32_t>(method);
-    entry.surface = surface->file();
-    entry.size = static_cast<std::uint32_t>(bytes.size());
-    std::ranges::copy(bytes, entry.bytes.begin());
-    std::ranges::find(known_, surface->file(), &Known::file)->lastSent = now;
-    loans_[count_ % FrameLane::kPlaces] = {serial, std::move(surface)};
+    entry.method = static_cast<std::uint32_t>(frame.method);
+    entry.surface = surface.file();
+    entry.size = static_cast<std::uint32_t>(frame.record.size());
+    std::ranges::copy(frame.record, entry.bytes.begin());
     lane_.put(count_++, entry);
+    return true;
 }
 
 void FrameLaneSender::takeGivenBack(LentSurfaces& gone) {
-    for (std::size_t place = 0; place < loans_.size(); ++place) {
-        Loan& loan = loans_[place];
-        if (loan.surface && lane_.isGivenBack(place, loan.serial))
-            gone.push_back(std::exchange(loan.surface, nullptr));
+    // From the latest on: usually that is the only one.
+    std::size_t left = lentCount_;
+    for (std::uint32_t number = count_ - 1; left > 0; --number) {
+        const std::size_t place = number % FrameLane::kPlaces;
+        if (!loans_[place].surface) continue;
+        --left;
+        if (lane_.isGivenBack(place, loans_[place].serial)) takeBack(place, gone);
     }
 }
 
 void FrameLaneSender::takeGivenBack(std::uint32_t serial, LentSurfaces& gone) {
-    for (Loan& loan : loans_) {
-        if (loan.surface && loan.serial == serial) gone.push_back(std::exchange(loan.surface, nullptr));
-    }
+    const auto loan = std::ranges::find(loans_, serial, &Loan::serial);
+    if (loan != loans_.end() && loan->surface)
+        takeBack(static_cast<std::size_t>(loan - loans_.begin()), gone);
 }
 
-std::size_t FrameLaneSender::lentCount() const {
-    return static_cast<std::size_t>(
-        std::ranges::count_if(loans_, [](const Loan& loan) { return loan.surface != nullptr; }));
+void FrameLaneSender::takeBack(std::size_t place, LentSurfaces& gone) {
+    gone.push_back(std::exchange(loans_[place].surface, nullptr));
+    --lentCount_;
 }
 
 }  // namespace kelvo

@@ -7,7 +7,6 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
-#include <span>
 #include <vector>
 
 namespace kelvo {
@@ -17,7 +16,6 @@ namespace kelvo {
 class FrameLaneSender {
   public:
     using Moment = std::chrono::steady_clock::time_point;
-    using Surface = std::shared_ptr<ObjectHandle>;
 
     /// How long after its last frame a surface counts as one that the client has: half of what the client
     /// keeps it for.
@@ -28,11 +26,9 @@ class FrameLaneSender {
 
     /// The surface went to the client in a message, or goes now.
     void sentInMessage(const VideoSurface& surface, Moment now);
-    /// Whether a frame can go by the lane: the client has the surface, and there is a place.
-    bool takes(const VideoSurface& surface, std::span<const std::byte> bytes, Moment now) const;
-    /// Puts one that it takes.
-    void put(std::uint32_t serial, std::size_t method, std::shared_ptr<VideoSurface> surface,
-             std::span<const std::byte> bytes, Moment now);
+    /// Puts a frame that can go by the lane: the client has the surface, and there is a place. False when
+    /// not.
+    bool put(std::uint32_t serial, const IPCFrame& frame, Moment now);
     /// To ring when the lock is free: that wakes a thread.
     const FrameLane& lane() const { return lane_; }
 
@@ -43,23 +39,24 @@ class FrameLaneSender {
     /// The client did not have a surface: all of them go in messages first.
     void forgetSurfaces() { known_.clear(); }
 
-    std::size_t lentCount() const;
+    std::size_t lentCount() const { return lentCount_; }
 
   private:
     struct Loan {
         std::uint32_t serial = 0;
-        Surface surface;
+        VideoSurfaceRef surface;
     };
     struct Known {
         VideoSurface::File file;
         VideoSurface::Geometry geometry;
         Moment lastSent;
     };
-    const Known* find(const VideoSurface& surface) const;
+    void takeBack(std::size_t place, LentSurfaces& gone);
 
     FrameLane lane_;
     std::uint32_t count_ = 0;
     std::array<Loan, FrameLane::kPlaces> loans_;
+    std::size_t lentCount_ = 0;
     std::vector<Known> known_;
 };
 

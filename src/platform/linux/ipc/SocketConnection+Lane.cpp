@@ -21,18 +21,6 @@ struct LaneFile : ObjectHandle {
     const FrameLane lane;
 };
 
-/// Whether a method is one that hands over frames: a surface, and a record about it.
-bool isFrame(const IPCMethod& description) {
-    return description.isOneWay() && description.arguments.size() == 2 &&
-           description.arguments[0].allowedObjects == IPCObjects::surfaces &&
-           description.arguments[1].signature == "ay";
-}
-
-/// The serial that follows; 0 is none.
-std::uint32_t after(std::uint32_t serial) {
-    return serial + 1 == 0 ? 1 : serial + 1;
-}
-
 }  // namespace
 
 // Server
@@ -56,18 +44,15 @@ void SocketConnection::answerWithLane(const dbus::Message& call) {
     afterPush(isWithinBounds);
 }
 
-/// False when it has to go as a message.
-bool SocketConnection::sendByLane(const IPCMethod& description, std::size_t method, const Array& arguments) {
-    if (!hasLane_ || !isFrame(description) || arguments.size() != 2) return false;
-    auto surface = VideoSurface::fromHandle(surfaceIn(description.arguments[0], arguments[0]));
-    const Bytes* bytes = arguments[1].as<Bytes>();
-    if (!surface || bytes == nullptr) return false;
+bool SocketConnection::handOver(const IPCFrame& frame) {
+    if (!hasLane_ || !frame.surface) return false;
     const Moment now = loop_->now();
     LentSurfaces givenBack;  // goes back after the lock is free
     std::unique_lock lock(outMutex_);
     if (!out_.lane || isOver() || cannotSend_ || !mayLend(givenBack)) return false;
-    if (!out_.lane->takes(*surface, *bytes, now)) return false;
-    out_.lane->put(nextSerial(), method, std::move(surface), *bytes, now);
+    const std::uint32_t serial = dbus::serialAfter(out_.lastSerial);
+    if (!out_.lane->put(serial, frame, now)) return false;
+    out_.lastSerial = serial;
     FrameLane lane = out_.lane->lane();  // it may end meanwhile
     lock.unlock();
     lane.ring();
@@ -161,31 +146,32 @@ bool SocketConnection::serveNextOfLane() {
     std::unique_lock lock(receiveMutex_);
     // Under the lock, so that what was received before has been served.
     if (!socket() || !queue().tryTakeTurn()) return false;
-    const std::optional<Frame> frame = takeFrame();
+    const std::optional<LaneFrame> frame = takeFrame();
     lock.unlock();
     queue().runInTurn([&] {
-        if (frame) serve(frame->method, frame->arguments, nullptr);
+        if (frame) serve(frame->call());
     });
     return frame.has_value();
 }
 
 bool SocketConnection::handleNextOfLane() {
     if (!lane_) return false;
-    std::optional<Frame> frame = takeFrame();
+    const std::optional<LaneFrame> frame = takeFrame();
     if (!frame) return false;
-    received(frame->method, std::move(frame->arguments), nullptr);
+    received(frame->call());
     return true;
 }
 
 /// Takes the frame at the front of the lane, if what was sent before it has been received. What was sent
 /// after it waits for it.
-std::optional<SocketConnection::Frame> SocketConnection::takeFrame() {
+std::optional<SocketConnection::LaneFrame> SocketConnection::takeFrame() {
     while (!isOver() && lane_->hasFront()) {
-        const FrameLane::Entry entry = lane_->front();
-        const auto ahead = static_cast<std::int32_t>(entry.serial - after(lastReceived_));
+        LaneFrame frame{lane_->front(), nullptr};
+        const auto ahead = static_cast<std::int32_t>(frame.entry.serial - dbus::serialAfter(lastReceived_));
         if (ahead > 0) break;
-        lastReceived_ = entry.serial;
-        if (auto frame = frameOf(entry, lane_->takeFront())) return frame;
+        lastReceived_ = frame.entry.serial;
+        frame.surface = surfaceOf(frame.entry, lane_->takeFront());
+        if (frame.surface) return frame;
     }
     return std::nullopt;
 }
@@ -210,30 +196,25 @@ class SocketConnection::FrameLoan {
     const VideoSurfaceRef surface_;
 };
 
-/// None when the surface is not there any more, which the daemon is told, or when it is no frame.
-std::optional<SocketConnection::Frame> SocketConnection::frameOf(const FrameLane::Entry& entry,
-                                                                 std::size_t place) {
-    const auto interface = exportedInterface();
-    if (!interface || entry.method >= interface->methods.size() ||
-        !isFrame(interface->methods[entry.method]) || entry.size > entry.bytes.size()) {
+/// A frame's surface, lent to whoever uses it. None when it is not there any more, which the daemon is told,
+/// or when it is no frame.
+VideoSurfaceRef SocketConnection::surfaceOf(const FrameLane::Entry& entry, std::size_t place) {
+    if (entry.size > entry.bytes.size()) {
         cutOff("frame that is none");
-        return std::nullopt;
+        return nullptr;
     }
     VideoSurfaceRef surface = surfaces_.find(entry.surface, loop_->now());
     if (!surface) {
         dbus::Message error = dbus::Message::replying(dbus::MessageType::error, entry.serial);
         error.errorName = kUnknownSurface;
         sendMessage(error);
-        return std::nullopt;
+        return nullptr;
     }
     holdSurfaces();
     VideoSurface* const pixels = surface.get();
-    const auto loan =
-        std::make_shared<FrameLoan>(std::static_pointer_cast<SocketConnection>(shared_from_this()),
-                                    entry.serial, place, std::move(surface));
-    const auto bytes = std::span(entry.bytes).first(entry.size);
-    return Frame{entry.method,
-                 {Array{std::shared_ptr<ObjectHandle>(loan, pixels)}, Bytes(bytes.begin(), bytes.end())}};
+    return {std::make_shared<FrameLoan>(std::static_pointer_cast<SocketConnection>(shared_from_this()),
+                                        entry.serial, place, std::move(surface)),
+            pixels};
 }
 
 }  // namespace kelvo

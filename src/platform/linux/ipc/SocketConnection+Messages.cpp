@@ -184,7 +184,6 @@ OptionalError SocketConnection::transmit(const IPCInterface& interface, std::siz
                                          const Array& arguments, ReplyIdentifier identifier,
                                          const ErrorReport& whenUnsent) {
     const IPCMethod& description = interface.methods[method];
-    if (identifier == 0 && sendByLane(description, method, arguments)) return std::nullopt;
     LentSurfaces lent =
         description.isOneWay() ? surfacesIn(description.arguments, arguments) : LentSurfaces();
     dbus::Message call;
@@ -224,10 +223,8 @@ void SocketConnection::sendMessage(dbus::Message& message) {
     afterPush(isWithinBounds);
 }
 
-/// 0 is no serial.
 std::uint32_t SocketConnection::nextSerial() {
-    if (++out_.lastSerial == 0) ++out_.lastSerial;
-    return out_.lastSerial;
+    return out_.lastSerial = dbus::serialAfter(out_.lastSerial);
 }
 
 /// Queues a message. False when that passes a bound; then nothing was queued.

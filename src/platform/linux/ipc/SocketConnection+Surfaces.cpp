@@ -38,12 +38,12 @@ void SocketConnection::letGo(std::uint32_t serial, std::optional<std::size_t> pl
         dbus::Message reply = dbus::Message::replying(dbus::MessageType::reply, serial);
         return sendMessage(reply);
     }
-    const Moment now = loop_->now();
     std::unique_lock lock(outMutex_);
     if (place && out_.returns.isQuiet() && !lane_->hasFront()) {
         out_.returns.letGoQuietly();
         return lane_->giveBack(*place, serial);
     }
+    const Moment now = loop_->now();
     if (!out_.returns.letGo(serial, now)) {
         lock.unlock();
         return loop_->tickAt(now + SurfaceReturns::kPatience);

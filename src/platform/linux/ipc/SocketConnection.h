@@ -37,6 +37,8 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     URL urlForPeer(const URL& url) const override;
     URL urlFromPeer(const URL& url) const override;
 
+    bool handOver(const IPCFrame& frame) override;
+
     void ready(std::uint32_t events) override;
     std::optional<Moment> tick(Moment now) override;
 
@@ -100,7 +102,6 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     void letGo(std::uint32_t serial, std::optional<std::size_t> place = {});
     // The lane, on a server's side.
     void answerWithLane(const dbus::Message& call);
-    bool sendByLane(const IPCMethod& description, std::size_t method, const Array& arguments);
     std::optional<Moment> takeGivenBackWhenLent(Moment now);
     bool mayLend(LentSurfaces& givenBack);
     void lend(std::uint32_t serial, LentSurfaces&& surfaces);
@@ -108,16 +109,18 @@ class SocketConnection : public ConnectionBase, public SocketWatcher {
     void askForLane();
     void openLane(dbus::Message& reply);
     /// A frame on its way to whoever serves it.
-    struct Frame {
-        std::size_t method;
-        Array arguments;
+    struct LaneFrame {
+        FrameLane::Entry entry;
+        VideoSurfaceRef surface;
+
+        IPCFrame call() const { return {entry.method, surface, std::span(entry.bytes).first(entry.size)}; }
     };
     class FrameLoan;
     void laneRang();
     bool serveNextOfLane();
     bool handleNextOfLane();
-    std::optional<Frame> takeFrame();
-    std::optional<Frame> frameOf(const FrameLane::Entry& entry, std::size_t place);
+    std::optional<LaneFrame> takeFrame();
+    VideoSurfaceRef surfaceOf(const FrameLane::Entry& entry, std::size_t place);
     void sendReturns(std::unique_lock<std::mutex> outLock);
     std::optional<Moment> returnSurfacesWhenDue(Moment now);
     IPCReply replyTo(std::uint32_t serial, const IPCMethod& method);
