@@ -159,6 +159,12 @@ TEST(SerialQueueTurnTest, SpareTimeIsSpentOnce) {
     EXPECT_NE(otherRanOn, std::this_thread::get_id());
 }
 
+TEST(SerialQueueTurnTest, ScopeLeavesTheOuterOnesTime) {
+    const SpareTime outer;
+    { const SpareTime inner; }
+    EXPECT_TRUE(SpareTime::isThere());
+}
+
 TEST(SerialQueueTurnTest, ScopeWithinAScopeHasTimeOfItsOwn) {
     SerialQueue queue("test.turn");
     SerialQueue other("test.other");
