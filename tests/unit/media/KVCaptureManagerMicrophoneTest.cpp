@@ -1,7 +1,6 @@
 #include "CaptureManagerFixture.h"
 #include "support/Threads.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <future>
@@ -10,7 +9,6 @@ namespace kelvo {
 namespace {
 
 using namespace std::chrono_literals;
-using testing::Contains;
 using testing::ElementsAre;
 
 class KVCaptureManagerMicrophoneTest : public test::CaptureManagerFixture {};
@@ -285,65 +283,6 @@ TEST_F(KVCaptureManagerMicrophoneTest, SampleWithoutAHandlerIsDroppedUnrecorded)
     EXPECT_EQ(manager->lastMicAudioDate(), std::nullopt);
 }
 
-TEST_F(KVCaptureManagerMicrophoneTest, InterruptionIsFilledWithSilenceOfItsLength) {
-    startMicrophone();
-    hear(100ms);
-    const MediaTime expected = manager->micInterruptionPresentationTimeStamp();
-    device.takeMicrophone();
-    EXPECT_TRUE(manager->isMicInterrupted());
-    device.advance(500ms);
-    device.giveMicrophoneBack();
-    hear(100ms);  // half a second after the end of the last sample, which was 100 ms ahead of its arrival
-    const auto samples = microphone.copy();
-    ASSERT_EQ(samples.size(), 3U);
-    EXPECT_EQ(samples[1]->sampleCount(), 22050);
-    EXPECT_EQ(samples[1]->audioBytes().size(), 44100U);
-    EXPECT_EQ(samples[1]->presentationTime(), expected);
-    EXPECT_EQ(samples[1]->duration(), MediaTime::make(22050, 44100));
-    EXPECT_FALSE(samples[1]->decodeTime().isValid());
-    EXPECT_EQ(samples[1]->audioFormat(), manager->audioBasicDescription());
-    EXPECT_TRUE(std::ranges::all_of(samples[1]->audioBytes(), [](std::byte b) { return b == std::byte{0}; }));
-    EXPECT_EQ(samples[2]->sampleCount(), 4410);
-    EXPECT_FALSE(manager->isMicInterrupted());
-    EXPECT_THAT(log.texts(), Contains("KVCaptureManager: MXAudioSessionInterruptionTypeBegan"));
-    EXPECT_THAT(log.texts(), Contains("KVCaptureManager: MXAudioSessionInterruptionTypeEnded"));
-    EXPECT_EQ(log.count("gap since last mic tap, filling with empty sample buffer"), 1U);
-}
-
-TEST_F(KVCaptureManagerMicrophoneTest, InterruptionBeforeTheFirstSampleOnlyClears) {
-    startMicrophone();
-    device.takeMicrophone();
-    hear(100ms);
-    EXPECT_EQ(microphone.copy().size(), 1U);
-    EXPECT_FALSE(manager->isMicInterrupted());
-    EXPECT_FALSE(log.contains("gap since last mic tap, filling with empty sample buffer"));
-}
-
-TEST_F(KVCaptureManagerMicrophoneTest, SampleThatComesBeforeItsTimeFillsNothing) {
-    startMicrophone();
-    hear(100ms);
-    device.takeMicrophone();
-    hear(100ms);  // exactly when it was expected
-    EXPECT_EQ(microphone.copy().size(), 2U);
-    EXPECT_FALSE(manager->isMicInterrupted());
-}
-
-TEST_F(KVCaptureManagerMicrophoneTest, GapThatTheClockMadeUpIsNotFilled) {
-    startMicrophone();
-    hear(100ms);
-    device.takeMicrophone();
-    device.advance(24h);
-    hear(100ms);
-    EXPECT_EQ(microphone.copy().size(), 2U);
-}
-
-TEST_F(KVCaptureManagerMicrophoneTest, EndOfAnInterruptionAndOtherTypesDoNotInterrupt) {
-    manager->handleAudioSessionInterruption(kAudioInterruptionEnded);
-    manager->handleAudioSessionInterruption(2);
-    EXPECT_FALSE(manager->isMicInterrupted());
-    EXPECT_THAT(log.texts(), ElementsAre("KVCaptureManager: MXAudioSessionInterruptionTypeEnded"));
-}
-
 TEST_F(KVCaptureManagerMicrophoneTest, CameraSamplesNeedAnOutputAndAHandler) {
     class Output : public CaptureOutput {};
     const auto output = std::make_shared<Output>();
@@ -411,16 +350,6 @@ TEST_F(KVCaptureManagerMicrophoneTest, StopAllForgetsHandlersAndTimes) {
     settle();
     hear(100ms);
     EXPECT_EQ(microphone.copy().size(), 1U) << "the handler of before is gone";
-}
-
-TEST_F(KVCaptureManagerMicrophoneTest, InterruptionIsHeardByTheManagerThatCameLast) {
-    startMicrophone();
-    manager->stopAllCapture();
-    const std::weak_ptr<KVCaptureManager> old = manager;
-    manager = KVCaptureManager::create(device.platform());
-    EXPECT_TRUE(old.expired());
-    device.takeMicrophone();
-    EXPECT_TRUE(manager->isMicInterrupted());
 }
 
 TEST_F(KVCaptureManagerMicrophoneTest, SamplesAfterTheManagersEndAreDropped) {
