@@ -34,10 +34,11 @@ inline constexpr std::chrono::milliseconds kLongestPause{5000};
 /// Sound that waits for the executor: about three seconds.
 inline constexpr int kMostWaitingAudioBuffers = 256;
 
-/// A handler that a program has set, or none. Held by whoever calls it, as it may be replaced meanwhile.
+/// A handler, or none. Held by whoever calls it, as it may be replaced meanwhile.
 template <typename Handler>
 using HeldHandler = std::shared_ptr<const Handler>;
 
+/// The handlers that a program has set.
 struct RecorderHandlers {
     HeldHandler<std::function<void(const RecorderState&)>> state;
     HeldHandler<Recorder::MovieHandler> stop;

@@ -26,7 +26,7 @@ class ConnectionBase : public IPCConnection, public std::enable_shared_from_this
     void setInvalidationHandler(std::function<void()> handler) override;
     void resume() override;
     void invalidate() override { end(State::over); }
-    /// A transport has a shorter way for frames or it has not.
+    /// Never, unless a transport has a shorter way for frames.
     bool handOver(const IPCFrame&) override { return false; }
     std::shared_ptr<IPCRemoteObject> remoteObjectProxyWithErrorHandler(
         std::function<void(const KVError&)> errorHandler) override;

@@ -13,8 +13,7 @@ struct Loan {
     std::shared_ptr<void> lease;
 };
 
-}  // namespace
-
+/// The surface of an argument that may carry one; none for any other.
 std::shared_ptr<ObjectHandle> surfaceIn(const IPCArgument& description, const Value& argument) {
     if (description.allowedObjects != IPCObjects::surfaces) return nullptr;
     const Array* array = argument.asArray();
@@ -22,6 +21,8 @@ std::shared_ptr<ObjectHandle> surfaceIn(const IPCArgument& description, const Va
     const auto* handle = array->front().as<std::shared_ptr<ObjectHandle>>();
     return handle != nullptr ? *handle : nullptr;
 }
+
+}  // namespace
 
 LentSurfaces surfacesIn(const std::vector<IPCArgument>& description, const Array& arguments) {
     LentSurfaces surfaces;

@@ -18,9 +18,6 @@ namespace kelvo {
 
 using LentSurfaces = std::vector<std::shared_ptr<ObjectHandle>>;
 
-/// The surface of an argument that may carry one; none for any other.
-std::shared_ptr<ObjectHandle> surfaceIn(const IPCArgument& description, const Value& argument);
-
 /// The surfaces among a message's arguments.
 LentSurfaces surfacesIn(const std::vector<IPCArgument>& description, const Array& arguments);
 
