@@ -1,4 +1,4 @@
-#include "CaptureManagerFixture.h"
+#include "AppAudioFixture.h"
 #include "support/Threads.h"
 
 #include <cerrno>
@@ -12,29 +12,7 @@ using testing::Contains;
 using testing::ElementsAre;
 using testing::Not;
 
-class KVCaptureManagerAppAudioTest : public test::CaptureManagerFixture {
-  protected:
-    void startTapWithinARecording() {
-        manager->setCaptureStartTime(MediaTime::make(0, 1000000000));
-        startTap();
-    }
-    void resumeTap() {
-        manager->resumeAppAudioCaptureForProcessID(kProcess, collect(appAudio));
-        settle();
-    }
-    std::shared_ptr<SimulatedInputQueue> queue() const { return device.audio->inputQueue(); }
-
-    static std::string startError(int code) {
-        return "KVRecordingManager: startAudioCapture error: " + std::to_string(code);
-    }
-
-    /// What every start logs, whether it went well or not.
-    const std::vector<std::string> startTexts{
-        "KVRecordingManager: startAudioCapture: Created Audio Queue Input",
-        "KVRecordingManager: startAudioCapture: Successfully set Audio Queue to PID",
-        "KVRecordingManager: startAudioCapture: Successfully started Audio Queue Recording",
-    };
-};
+using KVCaptureManagerAppAudioTest = test::AppAudioFixture;
 
 TEST_F(KVCaptureManagerAppAudioTest, StartSetsUpTheTapOfTheProcess) {
     startTap();
@@ -270,112 +248,6 @@ TEST_F(KVCaptureManagerAppAudioTest, AnotherStartTakesTheTapsPlace) {
     hear(50ms);
     EXPECT_EQ(appAudio.copy().size(), 1U);
     EXPECT_EQ(tapStarts, 2);
-}
-
-TEST_F(KVCaptureManagerAppAudioTest, TapThatCannotBeMadeLogsEveryStepAndItsTexts) {
-    device.failNext("AudioService.createInputQueue", EIO);
-    startTap();
-    EXPECT_EQ(device.audio->inputQueue(), nullptr);
-    EXPECT_EQ(log.count(startError(5)), 1U);
-    // The process, the format, ten buffers allocated and enqueued, the listener and the start.
-    EXPECT_EQ(log.count(startError(kAudioInvalidParameter)), 24U);
-    for (const std::string& text : startTexts)
-        EXPECT_EQ(log.count(text), 1U);
-    EXPECT_EQ(tapStarts, 0);
-    manager->stopAppAudioCapture();
-    EXPECT_TRUE(
-        log.contains("KVRecordingManager:stopAudioCapture:error: " + std::to_string(kAudioInvalidParameter)));
-    EXPECT_EQ(tap(), nullptr);
-}
-
-/// One failing step of a start.
-struct FailingStep {
-    const char* operation;
-    int failures;  ///< how many lines it causes
-};
-
-class KVCaptureManagerFailingStartTest : public KVCaptureManagerAppAudioTest,
-                                         public testing::WithParamInterface<FailingStep> {};
-
-TEST_P(KVCaptureManagerFailingStartTest, FailureIsLoggedAndTheStartGoesOn) {
-    device.failNext(GetParam().operation, EIO);
-    startTapWithinARecording();
-    EXPECT_EQ(log.count(startError(5)), 1U);
-    EXPECT_EQ(log.count(startError(kAudioInvalidBuffer)) + log.count(startError(kAudioInvalidRunState)),
-              static_cast<std::size_t>(GetParam().failures - 1));
-    for (const std::string& text : startTexts)
-        EXPECT_EQ(log.count(text), 1U);
-    EXPECT_EQ(tap()->format, manager->audioBasicDescription());
-}
-
-INSTANTIATE_TEST_SUITE_P(
-    EachStep, KVCaptureManagerFailingStartTest,
-    testing::Values(FailingStep{"AudioInputQueue.setTapProcess",
-                                2},  // a queue without a process cannot start
-                    FailingStep{"AudioInputQueue.streamFormat", 1},
-                    FailingStep{"AudioInputQueue.allocateBuffer", 2},  // no buffer, nothing to enqueue
-                    FailingStep{"AudioInputQueue.enqueueBuffer", 1},
-                    FailingStep{"AudioInputQueue.addRunningListener", 1},
-                    FailingStep{"AudioInputQueue.start", 1}),
-    [](const auto& step) {
-        return std::string(step.param.operation).substr(std::string("AudioInputQueue.").size());
-    });
-
-TEST_F(KVCaptureManagerAppAudioTest, PacketSizeOfAFormatWithoutOneIsAskedOfTheQueue) {
-    class Audio : public SimulatedAudio {
-      public:
-        using SimulatedAudio::SimulatedAudio;
-        Result<AudioInputQueueRef> createInputQueue(const AudioFormatRecord& format, AudioInputCallback call,
-                                                    std::uint32_t flags) override {
-            auto made = SimulatedAudio::createInputQueue(format, std::move(call), flags);
-            auto reported = format;
-            reported.bytesPerPacket = 0;
-            reported.sampleRate = 8000;
-            inputQueue()->setStreamFormat(reported);
-            return made;
-        }
-    };
-    Platform platform = device.platform();
-    platform.audio = std::make_shared<Audio>(device.clock, device.faults);
-    manager = KVCaptureManager::create(platform);
-    startTap();
-    EXPECT_EQ(tap()->format.bytesPerPacket, 0U);
-    EXPECT_EQ(tap()->bufferByteSize, 16000U);
-    manager->stopAllCapture();
-    device.failNext("AudioInputQueue.maximumOutputPacketSize", EIO);
-    startTap();
-    EXPECT_EQ(tap()->bufferByteSize, 0U);
-    EXPECT_TRUE(log.contains(startError(5)));
-    manager->stopAllCapture();
-}
-
-TEST_F(KVCaptureManagerAppAudioTest, SampleOfAFormatThatMakesNoSenseIsSkippedAndItsBufferReturned) {
-    startTapWithinARecording();
-    manager->stopAppAudioCapture();
-    class Audio : public SimulatedAudio {
-      public:
-        using SimulatedAudio::SimulatedAudio;
-        Result<AudioInputQueueRef> createInputQueue(const AudioFormatRecord& format, AudioInputCallback call,
-                                                    std::uint32_t flags) override {
-            auto made = SimulatedAudio::createInputQueue(format, std::move(call), flags);
-            auto reported = format;
-            reported.formatIdentifier = 0;
-            inputQueue()->setStreamFormat(reported);
-            return made;
-        }
-    };
-    Platform platform = device.platform();
-    const auto audio = std::make_shared<Audio>(device.clock, device.faults);
-    platform.audio = audio;
-    manager = KVCaptureManager::create(platform);
-    startTapWithinARecording();
-    audio->inputQueue()->fillNextBuffer(Bytes(4096), 0ns, 2048);
-    settle();
-    EXPECT_TRUE(appAudio.copy().empty());
-    EXPECT_EQ(manager->lastAudioDate(), std::nullopt);
-    EXPECT_EQ(tap()->currentPacket, 2048);
-    EXPECT_EQ(audio->inputQueue()->enqueuedCount(), 10U);
-    manager->stopAllCapture();
 }
 
 TEST_F(KVCaptureManagerAppAudioTest, StopAllStopsTheTapAndForgetsItsHandler) {
